@@ -1,0 +1,38 @@
+// Process-wide host access: which host the process talks to, the mapping of
+// absolute host paths, and the one function through which syslog lines go.
+#pragma once
+
+#include <cstdarg>
+#include <string>
+
+namespace HostCtl::Lib {
+
+// Chooses the backend once, at start-up. When the environment variable
+// VELK_HOST_ROOT names a folder, the process works on the simulated host in
+// that folder; otherwise on the machine it runs on. Calling it again does
+// nothing. Every other function here calls it on first use.
+void InitHost();
+
+// True when the process works on a simulated host.
+bool IsSimulatedHost();
+
+// The simulated host's root folder, or "" on a real host.
+const std::string& HostRoot();
+
+// Maps an absolute host path ("/bin/hrm-cmd", "/var/run/velk.pid") to the
+// path to use. Identity on a real host; inside the host root on a simulated
+// one. Relative paths and empty text come back unchanged.
+std::string HostPath(const std::string& absolutePath);
+
+// Sets the identity and facility of later syslog lines (as openlog does).
+void OpenLog(const char* ident, int option, int facility);
+
+// The one way a syslog line is written. priority may carry a facility
+// (LOG_AUTH | LOG_ERR); without one the facility of OpenLog is used. On a
+// simulated host the line is also appended to the host's
+// "/var/log/syslog.log" as
+//   "<ISO-8601 UTC time> <ident>[<pid>]: <facility>.<level>: <message>".
+void Syslog(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
+void VSyslog(int priority, const char* format, va_list args);
+
+}  // namespace HostCtl::Lib

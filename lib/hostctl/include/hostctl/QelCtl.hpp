@@ -1,0 +1,173 @@
+// The host control operations the console calls. Each object reads the host
+// through the backend chosen at start-up (see Backend.hpp); nothing is cached,
+// so every call sees the host's current state.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "hostctl/HostCtl.hpp"
+
+namespace QelCtl {
+
+namespace Util {
+
+// Kernel system-information nodes.
+enum class SysinfoNode { SystemVersion };
+
+// The system-version record: 312 bytes.
+//   0   product name, NUL-terminated (32 bytes)
+//   32  version text, NUL-terminated (64 bytes)
+//   96  kernel release text, NUL-terminated (32 bytes)
+//   128 build text, NUL-terminated (164 bytes)
+//   292 build number, 32-bit unsigned, host byte order
+//   296 reserved (16 bytes)
+constexpr size_t SYSINFO_VERSION_SIZE = 312;
+
+class SysinfoUtil {
+public:
+    // Fills buf (len must be at least SYSINFO_VERSION_SIZE); params is unused
+    // for the version node and may be null.
+    static void SysinfoGet(SysinfoNode node, const char* params, void* buf, size_t len);
+};
+
+}  // namespace Util
+
+namespace Adv {
+
+class AdvancedOptionImpl {
+public:
+    // The option with that name ("/UserVars/VelkTimeOut"), or null when the host
+    // has none. The result is an AdvancedIntegerOption or AdvancedStringOption.
+    std::unique_ptr<HostCtl::Adv::AdvancedOption> FindOption(const std::string& name);
+    // Whether a user option (such as "PXEBootEnabled") is present.
+    bool HasUserOption(const std::string& name);
+};
+
+}  // namespace Adv
+
+namespace Hardware {
+
+class HardwareInfoImpl {
+public:
+    std::string GetVendorName();
+    std::string GetProductName();
+};
+
+class CpuInfoImpl {
+public:
+    unsigned GetNumCpuPackages();
+    std::string GetModelName();
+};
+
+class MemoryInfoImpl {
+public:
+    uint64_t GetTotalPages();
+    uint64_t GetPageSize();
+};
+
+struct SmartCardSlot {
+    std::string name;
+};
+
+struct SmartCardToken {
+    std::string label;
+    std::vector<std::string> userIds;
+};
+
+class SmartCardInfoImpl {
+public:
+    std::vector<SmartCardSlot> GetAllSlots();
+    // Fills token and answers true when a token is present in the slot.
+    bool GetToken(const SmartCardSlot& slot, SmartCardToken& token);
+};
+
+}  // namespace Hardware
+
+namespace Network {
+
+class NetworkInfoImpl {
+public:
+    // Looks up which virtual NIC carries the management network.
+    void UpdateManagementInterface();
+    // The management interface found by the last update, or null.
+    std::unique_ptr<HostCtl::Network::QelNic> GetManagementInterface();
+    std::vector<HostCtl::Network::Pnic> GetPnics();
+    bool IsQelIpv6Enabled();
+    void SetQelIpv6Enabled(bool enabled);
+
+private:
+    bool _updated = false;
+    std::string _mgmtName;
+};
+
+class DnsConfigImpl {
+public:
+    explicit DnsConfigImpl(std::string netstack);
+    std::string GetHostname();
+    std::string GetDomain();
+    void SetHostname(const std::string& name);
+    void SetFqdn(const std::string& fqdn);
+    bool GetUseDhcp();
+    void SetUseDhcp(bool v);
+    std::vector<HostCtl::Network::Ipv4Address> GetNameServers();
+    std::vector<HostCtl::Network::Ipv6Address> GetIpv6NameServers();
+    void SetNameServers(const std::vector<HostCtl::Network::IpAddress>& servers);
+    std::vector<std::string> GetSearchDomains();
+    void SetSearchDomains(const std::vector<std::string>& domains);
+
+private:
+    std::string _netstack;
+};
+
+class RoutingInfoImpl {
+public:
+    explicit RoutingInfoImpl(std::string netstack);
+    HostCtl::Network::Ipv4Address GetQelKernelDefaultGateway();
+    void SetQelKernelDefaultGateway(const HostCtl::Network::Ipv4Address& gw);
+    HostCtl::Network::Ipv6Address GetIpv6QelKernelDefaultGateway();
+    void SetIpv6QelKernelDefaultGateway(const HostCtl::Network::Ipv6Address& gw);
+
+private:
+    std::string _netstack;
+};
+
+class VirtualSwitchInfoImpl {
+public:
+    // Names of the host's standard virtual switches.
+    std::vector<std::string> GetVirtualSwitchNames();
+};
+
+}  // namespace Network
+
+namespace System {
+
+struct BootOptions {
+    bool auditMode = false;
+};
+
+class SystemInfoImpl {
+public:
+    std::string GetWelcomeMessage();
+    void SetSystemAlert(const std::string& alert);
+    std::string GetSystemAlert();
+    BootOptions GetBootOptions();
+    std::string GetKeyboardLayout();
+    void SetKeyboardLayout(const std::string& layout);
+    std::vector<std::string> GetKeyboardLayouts();
+};
+
+}  // namespace System
+
+namespace Resource {
+
+class ResourceInfoImpl {
+public:
+    bool HasRunningVirtualMachines();
+};
+
+}  // namespace Resource
+
+}  // namespace QelCtl
