@@ -8,10 +8,17 @@
 namespace HostCtl::Lib {
 
 // Chooses the backend once, at start-up. When the environment variable
-// VELK_HOST_ROOT names a folder, the process works on the simulated host in
-// that folder; otherwise on the machine it runs on. Calling it again does
-// nothing. Every other function here calls it on first use.
+// VELK_HOST_ROOT is set and not empty, the process works on the simulated host
+// in that folder (a missing folder gives errors naming its state file, never
+// actions on the machine itself); otherwise on the machine it runs on.
+// Calling it again does nothing. Every other function here calls it on first
+// use.
 void InitHost();
+
+// Makes the process work on the simulated host in `root`, replacing the
+// choice of InitHost (tests and the simulated host's own tools use it). Not
+// safe while other threads use the host.
+void UseSimulatedHost(const std::string& root);
 
 // True when the process works on a simulated host.
 bool IsSimulatedHost();
@@ -31,7 +38,10 @@ void OpenLog(const char* ident, int option, int facility);
 // (LOG_AUTH | LOG_ERR); without one the facility of OpenLog is used. On a
 // simulated host the line is also appended to the host's
 // "/var/log/syslog.log" as
-//   "<ISO-8601 UTC time> <ident>[<pid>]: <facility>.<level>: <message>".
+//   "<ISO-8601 UTC time> <ident>[<pid>]: <facility>.<level>: <message>"
+// in one write, a line per call (control characters in the message written
+// as "#" and three octal digits). Before OpenLog the identity is the
+// program's short name. errno is the same after the call as before it.
 void Syslog(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
 void VSyslog(int priority, const char* format, va_list args);
 

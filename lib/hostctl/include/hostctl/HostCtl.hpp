@@ -30,6 +30,9 @@ public:
     std::string GetStringAddress() const;
     uint32_t GetHostOrder() const { return _addr; }
     bool IsZero() const { return _addr == 0; }
+    // True for a netmask: ones from the top, then only zeros (0.0.0.0 and
+    // 255.255.255.255 included).
+    bool IsValidNetmask() const;
     bool operator==(const Ipv4Address&) const = default;
 
 private:

@@ -1,0 +1,291 @@
+#include "Frame.hpp"
+
+#include <fcntl.h>
+#include <pthread.h>
+#include <sys/ioctl.h>
+#include <sys/select.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <memory>
+
+#include "Console.hpp"
+#include "StringFactory.hpp"
+#include "hostctl/Host.hpp"
+
+namespace Velk {
+
+using HostCtl::Lib::Syslog;
+
+Frame* Frame::fgFrame = nullptr;
+sigset_t Frame::_signalSet;
+int Frame::_signalPipe[2] = {-1, -1};
+QelCtl::Hardware::SmartCardInfoImpl Frame::_cardInfo;
+bool Frame::_isLoggedWithSmartCard = false;
+std::string Frame::_smartCardLoginId;
+std::string Frame::_loginName;
+bool Frame::_loggedIn = false;
+bool Frame::_markForRestart = false;
+unsigned int Frame::_idleTimeout = 600;
+
+namespace {
+constexpr long kDimSeconds = 60;
+
+// Time left from now until deadline, never negative.
+struct timeval Remaining(const struct timeval& now, const struct timeval& deadline) {
+    struct timeval left = {0, 0};
+    if (timercmp(&deadline, &now, >)) timersub(&deadline, &now, &left);
+    return left;
+}
+}  // namespace
+
+Frame::Frame(Frame* parent, int x, int y, int width, int height, int bg, int fg)
+    : Window(x, y, width, height, bg, fg), _parent(parent), _factory(StringFactory::Get("en_US")) {}
+
+Frame::~Frame() {
+    if (fgFrame == this) fgFrame = nullptr;
+}
+
+int Frame::Execute() {
+    fgFrame = nullptr;
+    if (_parent) {
+        _parent->Show(false);
+        _parent->Refresh();
+    }
+    Show(true);
+    fgFrame = this;
+    int result;
+    try {
+        result = Run();
+    } catch (const VelkTimeout&) {
+        fgFrame = nullptr;
+        throw;
+    }
+    if (_parent) {
+        _parent->Show(true);
+        _parent->Refresh();
+        fgFrame = _parent;
+        return result & 0xff;
+    }
+    fgFrame = nullptr;
+    return result;
+}
+
+int Frame::GetKey(bool useIdleTimeout) {
+    struct timeval start;
+    gettimeofday(&start, nullptr);
+    const bool limited = useIdleTimeout && _idleTimeout != 0;
+    const long limitSeconds = std::max<long>(_idleTimeout, kDimSeconds);
+    const struct timeval dimAt = {start.tv_sec + kDimSeconds, start.tv_usec};
+    const struct timeval timeoutAt = {start.tv_sec + limitSeconds, start.tv_usec};
+    bool dimmed = false;
+
+    for (;;) {
+        struct timeval now;
+        gettimeofday(&now, nullptr);
+        if (limited && timercmp(&now, &timeoutAt, >)) {
+            fgFrame = nullptr;
+            throw VelkTimeout();
+        }
+        int result;
+        if (!dimmed && timercmp(&now, &dimAt, >)) {
+            Show(false);
+            Refresh();
+            dimmed = true;
+        }
+        if (!dimmed) {
+            struct timeval left = Remaining(now, dimAt);
+            result = WaitForInput(&left);
+        } else if (limited) {
+            struct timeval left = Remaining(now, timeoutAt);
+            result = WaitForInput(&left);
+        } else {
+            result = WaitForInput(nullptr);
+        }
+
+        switch (result) {
+            case EV_TIMEOUT:
+                continue;
+            case EV_REFRESH:
+                if (fgFrame) fgFrame->Update();
+                CheckSmartCard();
+                continue;
+            case EV_RESTART:
+                if (_loggedIn) {
+                    _markForRestart = true;
+                    continue;
+                }
+                exit(0);
+            case EV_RESIZE:
+                ResizeTerminal();
+                exit(0);
+            case EV_TERMINATE:
+                exit(0);
+            default:
+                break;
+        }
+        if (result == KEY_RESIZE) {
+            ResizeTerminal();
+            exit(0);
+        }
+        if (result < 0) continue;
+        if (dimmed) {
+            clearok(curscr, TRUE);
+            Show(true);
+            Refresh();
+        }
+        return result;
+    }
+}
+
+int Frame::WaitForInput(struct timeval* timeout) {
+    fd_set fds;
+    FD_ZERO(&fds);
+    FD_SET(0, &fds);
+    FD_SET(_signalPipe[0], &fds);
+    int n = select(std::max(0, _signalPipe[0]) + 1, &fds, nullptr, nullptr, timeout);
+    if (n < 0) {
+        LogError("select() failed");
+        return EV_ERROR;
+    }
+    if (n == 0) return EV_TIMEOUT;
+    if (FD_ISSET(0, &fds)) {
+        wtimeout(stdscr, 0);
+        int key = wgetch(stdscr);
+        wtimeout(stdscr, -1);
+        return key;
+    }
+    if (FD_ISSET(_signalPipe[0], &fds)) {
+        unsigned char byte = 0;
+        ssize_t r;
+        do {
+            r = read(_signalPipe[0], &byte, 1);
+        } while (r <= 0 && errno == EINTR);
+        if (r == 1 && byte >= 1 && byte <= 4) return -2 - byte;
+    }
+    return EV_ERROR;
+}
+
+void Frame::StartSignalHandling() {
+    if (pipe2(_signalPipe, O_CLOEXEC) != 0) {
+        LogError("pipe() failed");
+        exit(1);
+    }
+    sigemptyset(&_signalSet);
+    for (int sig : {SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGWINCH}) sigaddset(&_signalSet, sig);
+    if (pthread_sigmask(SIG_BLOCK, &_signalSet, nullptr) != 0) LogError("pthread_sigmask() failed");
+    pthread_t thread;
+    if (pthread_create(&thread, nullptr, SignalHandler, nullptr) != 0) {
+        LogError("pthread_create() failed");
+        exit(1);
+    }
+    pthread_detach(thread);
+}
+
+void* Frame::SignalHandler(void*) {
+    for (;;) {
+        int sig = 0;
+        if (sigwait(&_signalSet, &sig) != 0) {
+            LogError("sigwait() failed");
+            continue;
+        }
+        unsigned char byte;
+        switch (sig) {
+            case SIGUSR1:
+                byte = 1;
+                break;
+            case SIGUSR2:
+                byte = 2;
+                break;
+            case SIGWINCH:
+                byte = 3;
+                break;
+            case SIGINT:
+            case SIGQUIT:
+            case SIGTERM:
+                byte = 4;
+                break;
+            default:
+                continue;
+        }
+        ssize_t w;
+        do {
+            w = write(_signalPipe[1], &byte, 1);
+        } while (w <= 0 && errno == EINTR);
+    }
+    return nullptr;
+}
+
+void Frame::ResizeTerminal() {
+    struct winsize ws = {};
+    if (ioctl(0, TIOCGWINSZ, &ws) != 0 || ws.ws_row == 0 || ws.ws_col == 0) return;
+    resizeterm(ws.ws_row, ws.ws_col);
+    Syslog(LOG_INFO, "Resized window to %dx%d", ws.ws_col, ws.ws_row);
+    refresh();
+}
+
+void Frame::LoadIdleTimeout() {
+    _idleTimeout = 600;
+    try {
+        QelCtl::Adv::AdvancedOptionImpl options;
+        std::unique_ptr<HostCtl::Adv::AdvancedOption> option = options.FindOption(VELK_TIMEOUT_VAR);
+        if (auto* integer = dynamic_cast<HostCtl::Adv::AdvancedIntegerOption*>(option.get())) {
+            _idleTimeout = static_cast<unsigned int>(integer->GetCurrent());
+        }
+    } catch (const HostCtl::Lib::HostCtlException&) {
+        // The default stays in force.
+    }
+}
+
+void Frame::SetLoggedIn(bool loggedIn) {
+    _loggedIn = loggedIn;
+    if (loggedIn) LoadIdleTimeout();
+}
+
+void Frame::SetLoginName(const std::string& name) {
+    _loginName = name;
+    _isLoggedWithSmartCard = IsSmartCardPresent(name);
+}
+
+std::string Frame::GetSmartCardUserId() {
+    try {
+        for (const auto& slot : _cardInfo.GetAllSlots()) {
+            QelCtl::Hardware::SmartCardToken token;
+            if (!_cardInfo.GetToken(slot, token)) continue;
+            for (const std::string& id : token.userIds) {
+                if (!id.empty()) return id;
+            }
+        }
+    } catch (const HostCtl::Lib::HostCtlException&) {
+        Syslog(LOG_ERR, "Error trying to lookup smart card tokens.");
+    }
+    return "";
+}
+
+bool Frame::IsSmartCardPresent(const std::string& userId) {
+    try {
+        for (const auto& slot : _cardInfo.GetAllSlots()) {
+            QelCtl::Hardware::SmartCardToken token;
+            if (!_cardInfo.GetToken(slot, token)) continue;
+            if (std::find(token.userIds.begin(), token.userIds.end(), userId) != token.userIds.end()) return true;
+        }
+    } catch (const HostCtl::Lib::HostCtlException&) {
+        Syslog(LOG_ERR, "Error trying to lookup smart card tokens.");
+    }
+    return false;
+}
+
+void Frame::CheckSmartCard() {
+    if (!_loggedIn) {
+        _smartCardLoginId = GetSmartCardUserId();
+        if (!_smartCardLoginId.empty()) Syslog(LOG_INFO, "Found smart card with user id '%s'", _smartCardLoginId.c_str());
+    } else if (_isLoggedWithSmartCard && !IsSmartCardPresent(_loginName)) {
+        Syslog(LOG_INFO, "Logging out user id '%s'", _loginName.c_str());
+        exit(0);
+    }
+}
+
+}  // namespace Velk

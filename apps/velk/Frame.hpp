@@ -1,0 +1,63 @@
+// The base of every screen: a window with a modal key loop, the key reader
+// that carries the idle dimming and timeout, the signal pipe, and the
+// console's login state.
+#pragma once
+
+#include <signal.h>
+#include <sys/time.h>
+
+#include <string>
+
+#include "Window.hpp"
+#include "hostctl/QelCtl.hpp"
+
+namespace Velk {
+
+class StringFactory;
+
+// Thrown out of GetKey when the idle timeout expires; unwinds every modal
+// frame back to the welcome window.
+struct VelkTimeout {};
+
+class Frame : public Window {
+public:
+    Frame(Frame* parent, int x, int y, int width, int height, int bg, int fg);
+    ~Frame() override;
+
+    virtual int Run() = 0;
+    virtual void Update() {}
+
+    int Execute();
+    int GetKey(bool useIdleTimeout);
+
+    static int WaitForInput(struct timeval* timeout);
+    static void StartSignalHandling();
+    static void* SignalHandler(void*);
+    static void ResizeTerminal();
+    static void LoadIdleTimeout();
+    static void SetLoggedIn(bool loggedIn);
+    static void SetLoginName(const std::string& name);
+    static std::string GetSmartCardUserId();
+    static bool IsSmartCardPresent(const std::string& userId);
+    static void CheckSmartCard();
+
+    // Event codes of WaitForInput.
+    enum Event { EV_ERROR = -1, EV_TIMEOUT = -2, EV_REFRESH = -3, EV_RESTART = -4, EV_RESIZE = -5, EV_TERMINATE = -6 };
+
+    static Frame* fgFrame;
+    static sigset_t _signalSet;
+    static int _signalPipe[2];
+    static QelCtl::Hardware::SmartCardInfoImpl _cardInfo;
+    static bool _isLoggedWithSmartCard;
+    static std::string _smartCardLoginId;
+    static std::string _loginName;
+    static bool _loggedIn;
+    static bool _markForRestart;
+    static unsigned int _idleTimeout;
+
+protected:
+    Frame* _parent;
+    StringFactory* _factory;
+};
+
+}  // namespace Velk

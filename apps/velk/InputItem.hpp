@@ -1,0 +1,61 @@
+// A text input field: a label, then an editable text on the right part of the
+// row. A prefilled value starts "fresh": it behaves as selected, so the first
+// printable key replaces it and the first Backspace or Delete erases it.
+//
+// The dialog passes keys to HandleKey. While the field is the list's current
+// item, Draw moves the screen's cursor (Window::MoveCursor) to the editing
+// position, and the list's final refresh puts the terminal cursor there; the
+// dialog shows the cursor with Window::SetCursor(true) while an input field
+// is current and hides it otherwise.
+#pragma once
+
+#include <string>
+
+#include "Item.hpp"
+
+namespace Velk {
+
+class InputItem : public Item {
+public:
+    // fieldWidth -1: half the row width minus 1.
+    InputItem(const std::string& label, const std::string& initialText, int fieldWidth = -1);
+    ~InputItem() override;
+
+    // Entering the field makes it fresh again, with the cursor at the end.
+    void Changed() override;
+    void Draw(TextArea* area) override;
+
+    // Applies an editing key (Home, End, Left, Right, Delete, Backspace or a
+    // printable character); false for any other key, which is ignored.
+    bool HandleKey(int key);
+
+    // Replaces the text; the field is fresh again with the cursor at the end.
+    void SetText(const std::string& text);
+    const std::string& GetText() const { return _text; }
+    const std::string& GetLabel() const { return _label; }
+    // Masked fields (passwords) show one "*" per character.
+    void SetMasked(bool masked) { _masked = masked; }
+    bool IsMasked() const { return _masked; }
+
+    int GetPosition() const { return _position; }
+    int GetOffset() const { return _offset; }
+    bool IsFresh() const { return _fresh; }
+    // Column of the editing position within the row's text area, as placed by
+    // the last Draw of the focused field.
+    int GetCursorColumn() const { return _cursorColumn; }
+
+private:
+    void Clear();
+    int Length() const { return static_cast<int>(_text.size()); }
+
+    std::string _label;
+    std::string _text;
+    int _fieldWidth;
+    bool _masked = false;
+    int _position;
+    int _offset = 0;
+    bool _fresh = true;
+    int _cursorColumn = 0;
+};
+
+}  // namespace Velk

@@ -1,0 +1,254 @@
+// Which host the process works on, the mapping of host paths, and syslog.
+#include "hostctl/Host.hpp"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <ctime>
+#include <deque>
+#include <filesystem>
+#include <memory>
+#include <mutex>
+#include <string>
+
+#include "UnsupportedHostBackend.hpp"
+#include "hostctl/Backend.hpp"
+#include "hostctl/SimState.hpp"
+
+namespace HostCtl::Lib {
+
+namespace {
+
+struct HostChoice {
+    std::mutex mutex;  // guards the choice of host and the syslog identity
+    bool chosen = false;
+    bool simulated = false;
+    std::string root;
+    std::unique_ptr<Backend> backend;
+
+    // openlog keeps the pointer it is given, so every identity ever set stays
+    // alive here (they are few: one per OpenLog call).
+    std::deque<std::string> idents;
+    const char* ident = nullptr;  // null until OpenLog: the program's short name
+    int facility = LOG_USER;
+};
+
+HostChoice& Choice() {
+    static HostChoice* choice = new HostChoice;  // never destroyed: used until the very end
+    return *choice;
+}
+
+// An absolute, lexically normal root without a trailing slash ("/" stays "/").
+std::string NormalRoot(const std::string& root) {
+    std::filesystem::path path(root);
+    std::error_code ec;
+    if (path.is_relative()) {
+        std::filesystem::path absolute = std::filesystem::absolute(path, ec);
+        if (!ec) path = absolute;
+    }
+    std::string text = path.lexically_normal().string();
+    while (text.size() > 1 && text.back() == '/') text.pop_back();
+    return text;
+}
+
+void ChooseSimulated(HostChoice& c, const std::string& root) {
+    c.chosen = true;
+    c.simulated = true;
+    c.root = NormalRoot(root);
+    c.backend = MakeSimulatedBackend(c.root);
+}
+
+void InitLocked(HostChoice& c) {
+    if (c.chosen) return;
+    // A set VELK_HOST_ROOT always means the simulated host, even when the
+    // folder is missing: a mistyped root must end in clear errors about the
+    // missing state, never in actions on the machine itself.
+    const char* root = getenv("VELK_HOST_ROOT");
+    if (root != nullptr && *root != '\0') {
+        ChooseSimulated(c, root);
+        return;
+    }
+    c.chosen = true;
+    c.simulated = false;
+    c.root.clear();
+    c.backend = MakeUnsupportedHostBackend();
+}
+
+const char* FacilityName(int facility) {
+    // Indexed by facility code (LOG_KERN is 0, LOG_LOCAL7 is 23); codes 12 to
+    // 15 have no common name.
+    static const char* const names[] = {"kern",    "user",    "mail",    "daemon",  "auth",     "syslog",
+                                        "lpr",     "news",    "uucp",    "cron",    "authpriv", "ftp",
+                                        "unknown", "unknown", "unknown", "unknown", "local0",   "local1",
+                                        "local2",  "local3",  "local4",  "local5",  "local6",   "local7"};
+    return names[LOG_FAC(facility) % 24];
+}
+
+const char* LevelName(int level) {
+    static const char* const names[] = {"emerg",   "alert",  "crit", "err",
+                                        "warning", "notice", "info", "debug"};
+    return names[level & LOG_PRIMASK];
+}
+
+std::string UtcNow() {
+    timespec now;
+    clock_gettime(CLOCK_REALTIME, &now);
+    tm utc;
+    gmtime_r(&now.tv_sec, &utc);
+    char text[80];
+    snprintf(text, sizeof text, "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", utc.tm_year + 1900, utc.tm_mon + 1,
+             utc.tm_mday, utc.tm_hour, utc.tm_min, utc.tm_sec, int(now.tv_nsec / 1000000) % 1000);
+    return text;
+}
+
+// One entry per line: trailing line ends are dropped and other control
+// characters are written as "#" and three octal digits, as syslog daemons do.
+std::string OneLine(const std::string& message) {
+    size_t end = message.size();
+    while (end > 0 && (message[end - 1] == '\n' || message[end - 1] == '\r')) --end;
+    std::string out;
+    out.reserve(end);
+    for (size_t i = 0; i < end; ++i) {
+        unsigned char ch = static_cast<unsigned char>(message[i]);
+        if (ch < 0x20 || ch == 0x7f) {
+            char code[5];
+            snprintf(code, sizeof code, "#%03o", ch);
+            out += code;
+        } else {
+            out += static_cast<char>(ch);
+        }
+    }
+    return out;
+}
+
+std::string Format(const char* format, va_list args) {
+    va_list copy;
+    va_copy(copy, args);
+    char small[512];
+    int n = vsnprintf(small, sizeof small, format, copy);
+    va_end(copy);
+    if (n < 0) return format;
+    if (size_t(n) < sizeof small) return std::string(small, size_t(n));
+    std::string text(size_t(n) + 1, '\0');
+    vsnprintf(text.data(), text.size(), format, args);
+    text.resize(size_t(n));
+    return text;
+}
+
+void AppendToHostLog(const std::string& path, const std::string& line) {
+    int fd = open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0644);
+    if (fd < 0) return;  // nowhere to report it: the line still went to syslog
+    // One write: appends of other processes land before or after it, never
+    // inside it.
+    ssize_t ignored = write(fd, line.data(), line.size());
+    (void)ignored;
+    close(fd);
+}
+
+}  // namespace
+
+void InitHost() {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    InitLocked(c);
+}
+
+void UseSimulatedHost(const std::string& root) {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    ChooseSimulated(c, root);
+}
+
+bool IsSimulatedHost() {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    InitLocked(c);
+    return c.simulated;
+}
+
+const std::string& HostRoot() {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    InitLocked(c);
+    return c.root;
+}
+
+std::string HostPath(const std::string& absolutePath) {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    InitLocked(c);
+    if (!c.simulated || absolutePath.empty() || absolutePath[0] != '/' || c.root == "/") return absolutePath;
+    return c.root + absolutePath;
+}
+
+Backend& GetBackend() {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    InitLocked(c);
+    return *c.backend;
+}
+
+void SetBackend(std::unique_ptr<Backend> backend) {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    InitLocked(c);
+    if (backend)
+        c.backend = std::move(backend);
+    else
+        c.backend = c.simulated ? MakeSimulatedBackend(c.root) : MakeUnsupportedHostBackend();
+}
+
+void OpenLog(const char* ident, int option, int facility) {
+    HostChoice& c = Choice();
+    std::lock_guard<std::mutex> lock(c.mutex);
+    if (ident != nullptr) {
+        c.idents.emplace_back(ident);
+        c.ident = c.idents.back().c_str();
+    } else {
+        c.ident = nullptr;
+    }
+    c.facility = facility & LOG_FACMASK;
+    openlog(c.ident, option, c.facility);
+}
+
+void VSyslog(int priority, const char* format, va_list args) {
+    const int savedErrno = errno;
+    HostChoice& c = Choice();
+    std::string ident;
+    std::string logPath;
+    int facility;
+    {
+        std::lock_guard<std::mutex> lock(c.mutex);
+        InitLocked(c);
+        ident = c.ident != nullptr ? c.ident : program_invocation_short_name;
+        facility = (priority & LOG_FACMASK) != 0 ? (priority & LOG_FACMASK) : c.facility;
+        if (c.simulated) logPath = c.root == "/" ? "/var/log/syslog.log" : c.root + "/var/log/syslog.log";
+    }
+    const int level = priority & LOG_PRIMASK;
+
+    errno = savedErrno;  // for "%m"
+    const std::string message = Format(format, args);
+    syslog(facility | level, "%s", message.c_str());
+
+    if (!logPath.empty()) {
+        std::string line = UtcNow() + " " + ident + "[" + std::to_string(getpid()) +
+                           "]: " + FacilityName(facility) + "." + LevelName(level) + ": " + OneLine(message) +
+                           "\n";
+        AppendToHostLog(logPath, line);
+    }
+    errno = savedErrno;
+}
+
+void Syslog(int priority, const char* format, ...) {
+    va_list args;
+    va_start(args, format);
+    VSyslog(priority, format, args);
+    va_end(args);
+}
+
+}  // namespace HostCtl::Lib

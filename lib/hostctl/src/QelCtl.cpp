@@ -1,0 +1,216 @@
+// The QelCtl information and configuration objects: thin wrappers that ask
+// the process's backend on every call.
+#include "hostctl/QelCtl.hpp"
+
+#include <algorithm>
+#include <cstring>
+#include <optional>
+#include <utility>
+
+#include "hostctl/Backend.hpp"
+
+namespace QelCtl {
+
+using HostCtl::Lib::GetBackend;
+using HostCtl::Lib::HostCtlException;
+
+namespace Util {
+
+namespace {
+
+// Copies `text` into a field of `width` bytes, cut to leave room for the NUL.
+void PutText(uint8_t* record, size_t offset, size_t width, const std::string& text) {
+    memcpy(record + offset, text.data(), std::min(text.size(), width - 1));
+}
+
+}  // namespace
+
+void SysinfoUtil::SysinfoGet(SysinfoNode node, const char* /*params*/, void* buf, size_t len) {
+    if (node != SysinfoNode::SystemVersion) throw HostCtlException("unknown system information node");
+    if (buf == nullptr || len < SYSINFO_VERSION_SIZE)
+        throw HostCtlException("the system version record needs a buffer of " +
+                               std::to_string(SYSINFO_VERSION_SIZE) + " bytes");
+    const HostCtl::Lib::VersionRecord version = GetBackend().GetVersionRecord();
+
+    uint8_t record[SYSINFO_VERSION_SIZE] = {};
+    PutText(record, 0, 32, version.product);
+    PutText(record, 32, 64, version.version);
+    PutText(record, 96, 32, version.kernelRelease);
+    PutText(record, 128, 164, version.build);
+    memcpy(record + 292, &version.buildNumber, sizeof version.buildNumber);
+    memcpy(buf, record, sizeof record);
+}
+
+}  // namespace Util
+
+namespace Adv {
+
+std::unique_ptr<HostCtl::Adv::AdvancedOption> AdvancedOptionImpl::FindOption(const std::string& name) {
+    std::optional<HostCtl::Lib::AdvancedOptionValue> value = GetBackend().FindAdvancedOption(name);
+    if (!value) return nullptr;
+    if (value->isInteger) return std::make_unique<HostCtl::Adv::AdvancedIntegerOption>(name, value->integer);
+    return std::make_unique<HostCtl::Adv::AdvancedStringOption>(name, value->text);
+}
+
+bool AdvancedOptionImpl::HasUserOption(const std::string& name) { return GetBackend().HasUserOption(name); }
+
+}  // namespace Adv
+
+namespace Hardware {
+
+std::string HardwareInfoImpl::GetVendorName() { return GetBackend().GetHardwareVendor(); }
+
+std::string HardwareInfoImpl::GetProductName() { return GetBackend().GetHardwareProduct(); }
+
+unsigned CpuInfoImpl::GetNumCpuPackages() { return GetBackend().GetCpuPackages(); }
+
+std::string CpuInfoImpl::GetModelName() { return GetBackend().GetCpuModel(); }
+
+uint64_t MemoryInfoImpl::GetTotalPages() { return GetBackend().GetMemoryTotalPages(); }
+
+uint64_t MemoryInfoImpl::GetPageSize() { return GetBackend().GetMemoryPageSize(); }
+
+std::vector<SmartCardSlot> SmartCardInfoImpl::GetAllSlots() { return GetBackend().GetSmartCardSlots(); }
+
+bool SmartCardInfoImpl::GetToken(const SmartCardSlot& slot, SmartCardToken& token) {
+    std::optional<SmartCardToken> found = GetBackend().GetSmartCardToken(slot.name);
+    if (!found) return false;
+    token = std::move(*found);
+    return true;
+}
+
+}  // namespace Hardware
+
+namespace Network {
+
+using HostCtl::Lib::DnsSettings;
+using HostCtl::Lib::RouteSettings;
+
+void NetworkInfoImpl::UpdateManagementInterface() {
+    _mgmtName = GetBackend().GetManagementInterfaceName();
+    _updated = true;
+}
+
+std::unique_ptr<HostCtl::Network::QelNic> NetworkInfoImpl::GetManagementInterface() {
+    if (!_updated) UpdateManagementInterface();
+    if (_mgmtName.empty()) return nullptr;
+    return std::make_unique<HostCtl::Network::QelNic>(_mgmtName);
+}
+
+std::vector<HostCtl::Network::Pnic> NetworkInfoImpl::GetPnics() { return GetBackend().GetPnics(); }
+
+bool NetworkInfoImpl::IsQelIpv6Enabled() { return GetBackend().GetIpv6Enabled(); }
+
+void NetworkInfoImpl::SetQelIpv6Enabled(bool enabled) { GetBackend().SetIpv6Enabled(enabled); }
+
+DnsConfigImpl::DnsConfigImpl(std::string netstack) : _netstack(std::move(netstack)) {}
+
+std::string DnsConfigImpl::GetHostname() { return GetBackend().GetDns(_netstack).hostname; }
+
+std::string DnsConfigImpl::GetDomain() { return GetBackend().GetDns(_netstack).domain; }
+
+void DnsConfigImpl::SetHostname(const std::string& name) {
+    DnsSettings dns;
+    dns.hostname = name;
+    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsHostname);
+}
+
+void DnsConfigImpl::SetFqdn(const std::string& fqdn) {
+    // The first label is the host name, the rest (possibly nothing) the domain.
+    DnsSettings dns;
+    size_t dot = fqdn.find('.');
+    dns.hostname = fqdn.substr(0, dot);
+    dns.domain = dot == std::string::npos ? "" : fqdn.substr(dot + 1);
+    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsHostname | HostCtl::Lib::DnsDomain);
+}
+
+bool DnsConfigImpl::GetUseDhcp() { return GetBackend().GetDns(_netstack).dhcp; }
+
+void DnsConfigImpl::SetUseDhcp(bool v) {
+    DnsSettings dns;
+    dns.dhcp = v;
+    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsDhcp);
+}
+
+std::vector<HostCtl::Network::Ipv4Address> DnsConfigImpl::GetNameServers() {
+    return GetBackend().GetDns(_netstack).servers;
+}
+
+std::vector<HostCtl::Network::Ipv6Address> DnsConfigImpl::GetIpv6NameServers() {
+    return GetBackend().GetDns(_netstack).ipv6Servers;
+}
+
+void DnsConfigImpl::SetNameServers(const std::vector<HostCtl::Network::IpAddress>& servers) {
+    DnsSettings dns;
+    for (const HostCtl::Network::IpAddress& server : servers) {
+        if (server.IsIpv6())
+            dns.ipv6Servers.push_back(server.V6());
+        else
+            dns.servers.push_back(server.V4());
+    }
+    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsServers);
+}
+
+std::vector<std::string> DnsConfigImpl::GetSearchDomains() {
+    return GetBackend().GetDns(_netstack).searchDomains;
+}
+
+void DnsConfigImpl::SetSearchDomains(const std::vector<std::string>& domains) {
+    DnsSettings dns;
+    dns.searchDomains = domains;
+    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsSearchDomains);
+}
+
+RoutingInfoImpl::RoutingInfoImpl(std::string netstack) : _netstack(std::move(netstack)) {}
+
+HostCtl::Network::Ipv4Address RoutingInfoImpl::GetQelKernelDefaultGateway() {
+    return GetBackend().GetRouting(_netstack).ipv4Gateway;
+}
+
+void RoutingInfoImpl::SetQelKernelDefaultGateway(const HostCtl::Network::Ipv4Address& gw) {
+    RouteSettings routes;
+    routes.ipv4Gateway = gw;
+    GetBackend().SetRouting(_netstack, routes, HostCtl::Lib::RouteIpv4Gateway);
+}
+
+HostCtl::Network::Ipv6Address RoutingInfoImpl::GetIpv6QelKernelDefaultGateway() {
+    return GetBackend().GetRouting(_netstack).ipv6Gateway;
+}
+
+void RoutingInfoImpl::SetIpv6QelKernelDefaultGateway(const HostCtl::Network::Ipv6Address& gw) {
+    RouteSettings routes;
+    routes.ipv6Gateway = gw;
+    GetBackend().SetRouting(_netstack, routes, HostCtl::Lib::RouteIpv6Gateway);
+}
+
+std::vector<std::string> VirtualSwitchInfoImpl::GetVirtualSwitchNames() {
+    return GetBackend().GetVirtualSwitchNames();
+}
+
+}  // namespace Network
+
+namespace System {
+
+std::string SystemInfoImpl::GetWelcomeMessage() { return GetBackend().GetWelcomeMessage(); }
+
+void SystemInfoImpl::SetSystemAlert(const std::string& alert) { GetBackend().SetSystemAlert(alert); }
+
+std::string SystemInfoImpl::GetSystemAlert() { return GetBackend().GetSystemAlert(); }
+
+BootOptions SystemInfoImpl::GetBootOptions() { return GetBackend().GetBootOptions(); }
+
+std::string SystemInfoImpl::GetKeyboardLayout() { return GetBackend().GetKeyboardLayout(); }
+
+void SystemInfoImpl::SetKeyboardLayout(const std::string& layout) { GetBackend().SetKeyboardLayout(layout); }
+
+std::vector<std::string> SystemInfoImpl::GetKeyboardLayouts() { return GetBackend().GetKeyboardLayouts(); }
+
+}  // namespace System
+
+namespace Resource {
+
+bool ResourceInfoImpl::HasRunningVirtualMachines() { return GetBackend().HasRunningVirtualMachines(); }
+
+}  // namespace Resource
+
+}  // namespace QelCtl

@@ -1,0 +1,78 @@
+// A backend for a real host that has no host control backend: every operation
+// fails with a text naming the operation.
+#include "UnsupportedHostBackend.hpp"
+
+namespace HostCtl::Lib {
+
+namespace {
+
+[[noreturn]] void Unavailable(const char* operation) {
+    throw HostCtlException(std::string(operation) +
+                           ": not available on this host (the host control library can only work on a "
+                           "simulated host; set VELK_HOST_ROOT)");
+}
+
+class UnsupportedHostBackend : public Backend {
+public:
+    VersionRecord GetVersionRecord() override { Unavailable("reading the system version"); }
+    std::string GetHardwareVendor() override { Unavailable("reading the hardware vendor"); }
+    std::string GetHardwareProduct() override { Unavailable("reading the hardware product"); }
+    unsigned GetCpuPackages() override { Unavailable("reading the CPU packages"); }
+    std::string GetCpuModel() override { Unavailable("reading the CPU model"); }
+    uint64_t GetMemoryPageSize() override { Unavailable("reading the memory page size"); }
+    uint64_t GetMemoryTotalPages() override { Unavailable("reading the memory size"); }
+
+    std::vector<Network::Pnic> GetPnics() override { Unavailable("listing the physical NICs"); }
+    std::string GetManagementInterfaceName() override { Unavailable("finding the management interface"); }
+    Network::IpConfig GetVnicIpConfig(const std::string&) override {
+        Unavailable("reading an IP configuration");
+    }
+    void SetVnicIpConfig(const std::string&, const Network::IpConfig&) override {
+        Unavailable("setting an IP configuration");
+    }
+    Network::ConnectionPoint GetVnicConnectionPoint(const std::string&) override {
+        Unavailable("reading a connection point");
+    }
+    bool GetIpv6Enabled() override { Unavailable("reading the IPv6 setting"); }
+    void SetIpv6Enabled(bool) override { Unavailable("setting IPv6"); }
+    DnsSettings GetDns(const std::string&) override { Unavailable("reading the DNS configuration"); }
+    void SetDns(const std::string&, const DnsSettings&, unsigned) override {
+        Unavailable("setting the DNS configuration");
+    }
+    RouteSettings GetRouting(const std::string&) override { Unavailable("reading the default gateways"); }
+    void SetRouting(const std::string&, const RouteSettings&, unsigned) override {
+        Unavailable("setting the default gateways");
+    }
+    std::vector<std::string> GetVirtualSwitchNames() override { Unavailable("listing the virtual switches"); }
+
+    std::string GetWelcomeMessage() override { Unavailable("reading the welcome message"); }
+    std::string GetSystemAlert() override { Unavailable("reading the system alert"); }
+    void SetSystemAlert(const std::string&) override { Unavailable("setting the system alert"); }
+    QelCtl::System::BootOptions GetBootOptions() override { Unavailable("reading the boot options"); }
+    std::string GetKeyboardLayout() override { Unavailable("reading the keyboard layout"); }
+    void SetKeyboardLayout(const std::string&) override { Unavailable("setting the keyboard layout"); }
+    std::vector<std::string> GetKeyboardLayouts() override { Unavailable("listing the keyboard layouts"); }
+
+    std::optional<AdvancedOptionValue> FindAdvancedOption(const std::string&) override {
+        Unavailable("reading an advanced option");
+    }
+    void SetAdvancedOption(const std::string&, const AdvancedOptionValue&) override {
+        Unavailable("setting an advanced option");
+    }
+    bool HasUserOption(const std::string&) override { Unavailable("reading a user option"); }
+
+    std::vector<QelCtl::Hardware::SmartCardSlot> GetSmartCardSlots() override {
+        Unavailable("listing the smart-card slots");
+    }
+    std::optional<QelCtl::Hardware::SmartCardToken> GetSmartCardToken(const std::string&) override {
+        Unavailable("reading a smart-card token");
+    }
+
+    bool HasRunningVirtualMachines() override { Unavailable("looking for running virtual machines"); }
+};
+
+}  // namespace
+
+std::unique_ptr<Backend> MakeUnsupportedHostBackend() { return std::make_unique<UnsupportedHostBackend>(); }
+
+}  // namespace HostCtl::Lib

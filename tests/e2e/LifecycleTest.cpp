@@ -1,0 +1,210 @@
+// Start and end of the real console: its first log lines, the PID file, the
+// terminal argument, and the signals and keys that end it for the host to
+// start it again.
+#include <signal.h>
+#include <sys/wait.h>
+#include <termios.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <functional>
+#include <regex>
+
+#include "SimHost.hpp"
+#include "Terminal.hpp"
+
+namespace E2e {
+namespace {
+
+const char kPidFile[] = "/var/run/velk.pid";
+const char kMultiple[] = "Attempt to run multiple VELK instances, not updating /var/run/velk.pid";
+
+::testing::AssertionResult WaitForWelcome(Terminal& t) { return t.WaitForText("Shut Down/Restart"); }
+
+std::string Joined(const std::vector<std::string>& lines) {
+    std::string all;
+    for (const auto& l : lines) all += l + "\n";
+    return all;
+}
+
+// The PID of a process that has ended.
+pid_t DeadPid() {
+    pid_t pid = fork();
+    if (pid == 0) _exit(0);
+    waitpid(pid, nullptr, 0);
+    return pid;
+}
+
+TEST(StartupTest, LogsStartWithIdentityAndWritesPidFile) {
+    SimHost host;
+    ASSERT_FALSE(host.Exists(kPidFile));
+    Terminal t(host.Console());
+    ASSERT_TRUE(WaitForWelcome(t));
+    const std::vector<std::string> starts = host.ConsoleLog("Starting VELK", t.Pid());
+    ASSERT_EQ(starts.size(), 1u) << Joined(host.SyslogLines());
+    const std::regex format(R"(\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d(\.\d+)?(Z|[+-]\d\d:?\d\d)? VELK\[)" +
+                            std::to_string(t.Pid()) + R"(\]: user\.info: Starting VELK)");
+    EXPECT_TRUE(std::regex_match(starts[0], format)) << starts[0];
+    EXPECT_EQ(host.ReadFile(kPidFile), std::to_string(t.Pid()));
+    EXPECT_TRUE(host.ConsoleLog("Invalid VT", t.Pid()).empty());
+    EXPECT_TRUE(host.ConsoleLog(kMultiple, t.Pid()).empty());
+}
+
+struct PidFileCase {
+    const char* name;
+    std::function<std::string()> content;  // what the PID file holds before the start
+    bool kept;                             // true: another live instance owns it
+};
+void PrintTo(const PidFileCase& c, std::ostream* os) { *os << c.name; }
+
+class PidFileTest : public ::testing::TestWithParam<PidFileCase> {};
+
+TEST_P(PidFileTest, OwnedOnlyByALiveInstance) {
+    const PidFileCase& c = GetParam();
+    SimHost host;
+    const std::string before = c.content();
+    host.WriteFile(kPidFile, before);
+    Terminal t(host.Console());
+    ASSERT_TRUE(WaitForWelcome(t));
+    EXPECT_EQ(host.ReadFile(kPidFile), c.kept ? before : std::to_string(t.Pid()));
+    const auto refused = host.ConsoleLog(kMultiple, t.Pid());
+    EXPECT_EQ(refused.size(), c.kept ? 1u : 0u) << Joined(host.SyslogLines());
+    if (!refused.empty()) {
+        EXPECT_NE(refused[0].find("user.err: "), std::string::npos) << refused[0];
+    }
+    // A second instance is not refused: it runs on.
+    EXPECT_FALSE(t.HasExited());
+    EXPECT_TRUE(t.Contains("Download tools to manage this host from:"));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Contents, PidFileTest,
+    ::testing::Values(PidFileCase{"Stale", [] { return std::to_string(DeadPid()); }, false},
+                      PidFileCase{"StaleWithNewline", [] { return std::to_string(DeadPid()) + "\n"; }, false},
+                      PidFileCase{"Empty", [] { return std::string(); }, false},
+                      PidFileCase{"NotANumber", [] { return std::string("velk"); }, false},
+                      PidFileCase{"Zero", [] { return std::string("0"); }, false},
+                      PidFileCase{"Negative", [] { return std::string("-1"); }, false},
+                      PidFileCase{"LiveProcess", [] { return std::to_string(getpid()); }, true},
+                      PidFileCase{"LiveProcessWithNewline", [] { return std::to_string(getpid()) + "\n"; },
+                                  true}),
+    [](const auto& info) { return std::string(info.param.name); });
+
+TEST(StartupTest, SecondInstanceLeavesPidFileToFirst) {
+    SimHost host;
+    Terminal first(host.Console());
+    ASSERT_TRUE(WaitForWelcome(first));
+    Terminal second(host.Console("vt100", 80, 24));
+    ASSERT_TRUE(WaitForWelcome(second));
+    EXPECT_EQ(host.ReadFile(kPidFile), std::to_string(first.Pid()));
+    EXPECT_EQ(host.ConsoleLog(kMultiple, second.Pid()).size(), 1u) << Joined(host.SyslogLines());
+    EXPECT_TRUE(host.ConsoleLog(kMultiple, first.Pid()).empty());
+
+    // Once the first has gone, the next start takes the file over.
+    first.Signal(SIGTERM);
+    ASSERT_TRUE(first.ExitsWith(0));
+    Terminal third(host.Console());
+    ASSERT_TRUE(WaitForWelcome(third));
+    EXPECT_EQ(host.ReadFile(kPidFile), std::to_string(third.Pid()));
+}
+
+struct VtCase {
+    const char* arg;
+    bool valid;
+};
+void PrintTo(const VtCase& c, std::ostream* os) { *os << "\"" << c.arg << "\""; }
+
+class VtArgumentTest : public ::testing::TestWithParam<VtCase> {};
+
+TEST_P(VtArgumentTest, InvalidLoggedAndIgnored) {
+    const VtCase& c = GetParam();
+    SimHost host;
+    Terminal t(host.Console("linux", 80, 25, {c.arg}));
+    ASSERT_TRUE(WaitForWelcome(t));
+    const auto invalid = host.ConsoleLog(std::string("Invalid VT specified for VELK: ") + c.arg, t.Pid());
+    if (c.valid) {
+        EXPECT_TRUE(invalid.empty()) << Joined(invalid);
+        // Switching to a terminal also disables the suspend character.
+        EXPECT_EQ(t.Modes().c_cc[VSUSP], 0) << "suspend character not disabled";
+    } else {
+        ASSERT_EQ(invalid.size(), 1u) << Joined(host.SyslogLines());
+        EXPECT_NE(invalid[0].find(".err: Invalid VT specified for VELK: "), std::string::npos) << invalid[0];
+        // The line names the argument exactly, nothing after it.
+        EXPECT_EQ(invalid[0].substr(invalid[0].size() - strlen(c.arg)), c.arg);
+        EXPECT_EQ(t.Modes().c_cc[VSUSP], 'Z' & 0x1f) << "suspend character changed";
+    }
+    EXPECT_EQ(host.ConsoleLog("Starting VELK", t.Pid()).size(), 1u);
+    EXPECT_FALSE(t.HasExited());
+    t.Signal(SIGTERM);
+    EXPECT_TRUE(t.ExitsWith(0));
+}
+
+INSTANTIATE_TEST_SUITE_P(Args, VtArgumentTest,
+                         ::testing::Values(VtCase{"0", false}, VtCase{"64", false}, VtCase{"-3", false},
+                                           VtCase{"tty2", false}, VtCase{"", false},
+                                           VtCase{"99999999999999999999", false}, VtCase{"1", true},
+                                           VtCase{"63", true}),
+                         [](const auto& info) {
+                             std::string name;
+                             for (char ch : std::string(info.param.arg))
+                                 name += isalnum(static_cast<unsigned char>(ch)) ? ch : '_';
+                             return "arg_" + name + (info.param.valid ? "_valid" : "_invalid");
+                         });
+
+// Ways the console ends with status 0 while nobody is logged in.
+struct EndCase {
+    const char* name;
+    const char* term;
+    std::function<void(Terminal&)> act;
+    const char* resized;  // expected "Resized window to ..." size, or null: no such line
+};
+void PrintTo(const EndCase& c, std::ostream* os) { *os << c.name; }
+
+class EndTest : public ::testing::TestWithParam<EndCase> {};
+
+TEST_P(EndTest, ExitsWithStatusZero) {
+    const EndCase& c = GetParam();
+    SimHost host;
+    Terminal t(host.Console(c.term, 80, 25));
+    ASSERT_TRUE(WaitForWelcome(t));
+    c.act(t);
+    ASSERT_TRUE(t.ExitsWith(0, Duration(5000)));
+    const auto resized = host.ConsoleLog("Resized window to ", t.Pid());
+    if (c.resized) {
+        ASSERT_EQ(resized.size(), 1u) << Joined(host.SyslogLines());
+        EXPECT_NE(resized[0].find(std::string("user.info: Resized window to ") + c.resized),
+                  std::string::npos)
+            << resized[0];
+        EXPECT_EQ(resized[0].substr(resized[0].size() - strlen(c.resized)), c.resized) << resized[0];
+    } else {
+        EXPECT_TRUE(resized.empty()) << Joined(resized);
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Ways, EndTest,
+    ::testing::Values(EndCase{"Sigterm", "linux", [](Terminal& t) { t.Signal(SIGTERM); }, nullptr},
+                      EndCase{"Sigint", "linux", [](Terminal& t) { t.Signal(SIGINT); }, nullptr},
+                      EndCase{"Sigquit", "vt100", [](Terminal& t) { t.Signal(SIGQUIT); }, nullptr},
+                      EndCase{"Sigusr2LoggedOut", "linux", [](Terminal& t) { t.Signal(SIGUSR2); }, nullptr},
+                      EndCase{"PtyResized", "linux", [](Terminal& t) { t.Resize(100, 31); }, "100x31"},
+                      EndCase{"PtyResizedSerial", "xterm", [](Terminal& t) { t.Resize(132, 43); }, "132x43"},
+                      EndCase{"SigwinchSameSize", "linux", [](Terminal& t) { t.Signal(SIGWINCH); }, "80x25"},
+                      EndCase{"EscR", "linux", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"},
+                      EndCase{"EscRSerial", "vt100", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"}),
+    [](const auto& info) { return std::string(info.param.name); });
+
+TEST(EndTest, RefreshSignalDoesNotEnd) {
+    SimHost host;
+    Terminal t(host.Console());
+    ASSERT_TRUE(WaitForWelcome(t));
+    for (int i = 0; i < 3; ++i) t.Signal(SIGUSR1);
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_FALSE(t.HasExited());
+    EXPECT_TRUE(t.Contains("Shut Down/Restart")) << t.Dump();
+    t.Signal(SIGTERM);
+    EXPECT_TRUE(t.ExitsWith(0));
+}
+
+}  // namespace
+}  // namespace E2e

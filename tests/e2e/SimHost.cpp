@@ -1,0 +1,184 @@
+#include "SimHost.hpp"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <stdexcept>
+
+extern char** environ;
+
+namespace E2e {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+struct Output {
+    int status = -1;
+    std::string out, err;
+};
+
+// Runs a program with the test's environment; returns its status and output.
+Output Run(const std::vector<std::string>& args) {
+    int outPipe[2], errPipe[2];
+    if (pipe2(outPipe, O_CLOEXEC) != 0 || pipe2(errPipe, O_CLOEXEC) != 0)
+        throw std::runtime_error(std::string("pipe: ") + strerror(errno));
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+    posix_spawn_file_actions_adddup2(&actions, outPipe[1], 1);
+    posix_spawn_file_actions_adddup2(&actions, errPipe[1], 2);
+    std::vector<char*> argv;
+    for (const auto& a : args) argv.push_back(const_cast<char*>(a.c_str()));
+    argv.push_back(nullptr);
+    pid_t pid = -1;
+    int rc = posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ);
+    posix_spawn_file_actions_destroy(&actions);
+    close(outPipe[1]);
+    close(errPipe[1]);
+    Output result;
+    if (rc != 0) {
+        close(outPipe[0]);
+        close(errPipe[0]);
+        throw std::runtime_error("cannot run " + args[0] + ": " + strerror(rc));
+    }
+    struct pollfd fds[2] = {{outPipe[0], POLLIN, 0}, {errPipe[0], POLLIN, 0}};
+    std::string* sinks[2] = {&result.out, &result.err};
+    int open = 2;
+    while (open > 0) {
+        if (poll(fds, 2, -1) < 0) {
+            if (errno == EINTR) continue;
+            break;
+        }
+        for (int i = 0; i < 2; ++i) {
+            if (fds[i].fd < 0 || !(fds[i].revents & (POLLIN | POLLHUP | POLLERR))) continue;
+            char buf[4096];
+            ssize_t n = read(fds[i].fd, buf, sizeof buf);
+            if (n > 0) {
+                sinks[i]->append(buf, size_t(n));
+            } else if (n == 0 || errno != EINTR) {
+                close(fds[i].fd);
+                fds[i].fd = -1;
+                --open;
+            }
+        }
+    }
+    while (waitpid(pid, &result.status, 0) < 0 && errno == EINTR) {
+    }
+    return result;
+}
+
+bool Keep() {
+    const char* keep = getenv("VELK_E2E_KEEP");
+    return keep && *keep && std::strcmp(keep, "0") != 0;
+}
+
+}  // namespace
+
+SimHost::SimHost(const std::string& hostname) {
+    const char* tmp = getenv("TMPDIR");
+    std::string pattern = std::string(tmp && *tmp ? tmp : "/tmp") + "/velk-e2e-XXXXXX";
+    if (!mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp " + pattern + ": " + strerror(errno));
+    _dir = pattern;
+    _root = _dir + "/host";
+    try {
+        Tool({"create", _root, "--hostname", hostname});
+    } catch (...) {
+        if (!Keep()) fs::remove_all(_dir);
+        throw;
+    }
+}
+
+SimHost::~SimHost() {
+    if (Keep()) {
+        fprintf(stderr, "keeping the host root %s\n", _root.c_str());
+        return;
+    }
+    std::error_code ec;
+    fs::remove_all(_dir, ec);
+}
+
+std::string SimHost::Tool(const std::vector<std::string>& args) const {
+    std::vector<std::string> argv{VELK_SIMHOST_BIN};
+    argv.insert(argv.end(), args.begin(), args.end());
+    Output out = Run(argv);
+    if (!WIFEXITED(out.status) || WEXITSTATUS(out.status) != 0) {
+        std::string command;
+        for (const auto& a : argv) command += (command.empty() ? "" : " ") + a;
+        throw std::runtime_error(command + " failed (status " + std::to_string(out.status) + "): " + out.err);
+    }
+    return out.out;
+}
+
+nlohmann::json SimHost::Get(const std::string& pointer) const {
+    return nlohmann::json::parse(Tool({"get", _root, pointer}));
+}
+
+void SimHost::Set(const std::string& pointer, const nlohmann::json& value) {
+    Tool({"set", _root, pointer, value.dump()});
+}
+
+void SimHost::Remove(const std::string& pointer) { Tool({"remove", _root, pointer}); }
+
+bool SimHost::Exists(std::string_view hostPath) const { return fs::exists(Path(hostPath)); }
+
+std::string SimHost::ReadFile(std::string_view hostPath) const {
+    std::ifstream in(Path(hostPath), std::ios::binary);
+    if (!in) throw std::runtime_error("cannot read " + Path(hostPath));
+    std::stringstream ss;
+    ss << in.rdbuf();
+    return ss.str();
+}
+
+void SimHost::WriteFile(std::string_view hostPath, const std::string& content) const {
+    std::ofstream out(Path(hostPath), std::ios::binary | std::ios::trunc);
+    out << content;
+    if (!out) throw std::runtime_error("cannot write " + Path(hostPath));
+}
+
+void SimHost::RemoveFile(std::string_view hostPath) const { fs::remove(Path(hostPath)); }
+
+std::vector<std::string> SimHost::SyslogLines() const {
+    std::vector<std::string> lines;
+    std::ifstream in(Path("/var/log/syslog.log"));
+    for (std::string line; std::getline(in, line);) lines.push_back(line);
+    return lines;
+}
+
+std::vector<std::string> SimHost::ConsoleLog(std::string_view text, pid_t pid) const {
+    const std::string tag = "[" + std::to_string(pid) + "]: ";
+    std::vector<std::string> found;
+    for (const auto& line : SyslogLines()) {
+        if (pid != 0 && line.find(tag) == std::string::npos) continue;
+        if (line.find(text) != std::string::npos) found.push_back(line);
+    }
+    return found;
+}
+
+TerminalOptions SimHost::Console(const std::string& term, int cols, int rows,
+                                 std::vector<std::string> args) const {
+    TerminalOptions options;
+    options.program = VELK_BIN;
+    options.args = std::move(args);
+    options.term = term;
+    options.cols = cols;
+    options.rows = rows;
+    options.env = {"VELK_HOST_ROOT=" + _root, "LANG=C.UTF-8", "ESCDELAY=25",
+                   "PATH=/usr/sbin:/usr/bin:/sbin:/bin"};
+    // Sanitizer settings of the test run reach the console too.
+    for (const char* name : {"ASAN_OPTIONS", "UBSAN_OPTIONS", "LSAN_OPTIONS"}) {
+        if (const char* value = getenv(name)) options.env.push_back(std::string(name) + "=" + value);
+    }
+    return options;
+}
+
+}  // namespace E2e

@@ -1,0 +1,55 @@
+// A simulated host for one test: a host root in a fresh temporary folder,
+// created and edited through velk-simhost, removed again at the end (kept
+// when VELK_E2E_KEEP is set, for a look after a failure).
+#pragma once
+
+#include <nlohmann/json.hpp>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "Terminal.hpp"
+
+namespace E2e {
+
+class SimHost {
+public:
+    explicit SimHost(const std::string& hostname = "host1");
+    ~SimHost();
+    SimHost(const SimHost&) = delete;
+    SimHost& operator=(const SimHost&) = delete;
+
+    const std::string& Root() const { return _root; }
+    // The file system path of a host path ("/var/run/velk.pid").
+    std::string Path(std::string_view hostPath) const { return _root + std::string(hostPath); }
+
+    // State access by JSON pointer ("/network/vnics/0/ipv4/address"). Failures
+    // throw std::runtime_error with the tool's message.
+    nlohmann::json Get(const std::string& pointer) const;
+    void Set(const std::string& pointer, const nlohmann::json& value);
+    void Remove(const std::string& pointer);
+
+    // Files of the host.
+    bool Exists(std::string_view hostPath) const;
+    std::string ReadFile(std::string_view hostPath) const;
+    void WriteFile(std::string_view hostPath, const std::string& content) const;
+    void RemoveFile(std::string_view hostPath) const;
+
+    // Lines of "/var/log/syslog.log".
+    std::vector<std::string> SyslogLines() const;
+    // Lines written by the console: "<time> <ident>[<pid>]: ..." with `pid`
+    // (any pid when 0) whose text contains `text`.
+    std::vector<std::string> ConsoleLog(std::string_view text, pid_t pid = 0) const;
+
+    // How to run the console on this host in a terminal.
+    TerminalOptions Console(const std::string& term = "linux", int cols = 80, int rows = 25,
+                            std::vector<std::string> args = {}) const;
+
+private:
+    std::string Tool(const std::vector<std::string>& args) const;
+
+    std::string _dir;   // the temporary folder
+    std::string _root;  // the host root inside it
+};
+
+}  // namespace E2e

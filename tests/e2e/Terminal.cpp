@@ -1,0 +1,630 @@
+#include "Terminal.hpp"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <pty.h>
+#include <signal.h>
+#include <sys/ioctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <vterm.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <stdexcept>
+
+namespace E2e {
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+int HexDigit(char c) {
+    if (c >= '0' && c <= '9') return c - '0';
+    if (c >= 'a' && c <= 'f') return c - 'a' + 10;
+    if (c >= 'A' && c <= 'F') return c - 'A' + 10;
+    return -1;
+}
+
+void AppendUtf8(std::string& out, uint32_t cp) {
+    if (cp < 0x80) {
+        out += char(cp);
+    } else if (cp < 0x800) {
+        out += char(0xC0 | (cp >> 6));
+        out += char(0x80 | (cp & 0x3F));
+    } else if (cp < 0x10000) {
+        out += char(0xE0 | (cp >> 12));
+        out += char(0x80 | ((cp >> 6) & 0x3F));
+        out += char(0x80 | (cp & 0x3F));
+    } else {
+        out += char(0xF0 | (cp >> 18));
+        out += char(0x80 | ((cp >> 12) & 0x3F));
+        out += char(0x80 | ((cp >> 6) & 0x3F));
+        out += char(0x80 | (cp & 0x3F));
+    }
+}
+
+CellColor ToCellColor(const VTermColor& c, bool foreground) {
+    CellColor color;
+    if (foreground ? VTERM_COLOR_IS_DEFAULT_FG(&c) : VTERM_COLOR_IS_DEFAULT_BG(&c)) return color;
+    if (VTERM_COLOR_IS_INDEXED(&c)) {
+        color.kind = CellColor::Kind::Indexed;
+        color.index = c.indexed.idx;
+    } else {
+        color.kind = CellColor::Kind::Direct;
+        color.rgb = {c.rgb.red, c.rgb.green, c.rgb.blue};
+    }
+    return color;
+}
+
+// One character per cell for the colour lines of a dump.
+char ColorChar(const CellColor& c) {
+    switch (c.kind) {
+        case CellColor::Kind::Default:
+            return '.';
+        case CellColor::Kind::Indexed:
+            return c.index < 16 ? "0123456789abcdef"[c.index] : '+';
+        case CellColor::Kind::Direct:
+            return '#';
+    }
+    return '?';
+}
+
+std::string Trim(const std::string& s) {
+    size_t b = s.find_first_not_of(' ');
+    if (b == std::string::npos) return {};
+    size_t e = s.find_last_not_of(' ');
+    return s.substr(b, e - b + 1);
+}
+
+}  // namespace
+
+std::string ToString(const Rgb& rgb) {
+    char buf[16];
+    snprintf(buf, sizeof buf, "#%02x%02x%02x", rgb.r, rgb.g, rgb.b);
+    return buf;
+}
+
+std::string ToString(const CellColor& color) {
+    switch (color.kind) {
+        case CellColor::Kind::Default:
+            return "default";
+        case CellColor::Kind::Indexed:
+            return "index " + std::to_string(color.index);
+        case CellColor::Kind::Direct:
+            return ToString(color.rgb);
+    }
+    return "?";
+}
+
+std::string LinuxPaletteFilter::Feed(std::string_view bytes, std::vector<PaletteChange>& changes) {
+    std::string in = _held;
+    in.append(bytes);
+    _held.clear();
+    std::string out;
+    out.reserve(in.size());
+    size_t i = 0;
+    while (i < in.size()) {
+        size_t esc = in.find('\x1b', i);
+        if (esc == std::string::npos) {
+            out.append(in, i, std::string::npos);
+            break;
+        }
+        out.append(in, i, esc - i);
+        const size_t rest = in.size() - esc;
+        // Incomplete prefixes of the two sequences wait for the next read.
+        if (rest < 2 || (in[esc + 1] == ']' && rest < 3) ||
+            (in[esc + 1] == ']' && in[esc + 2] == 'P' && rest < 10)) {
+            _held = in.substr(esc);
+            break;
+        }
+        if (in[esc + 1] == ']' && in[esc + 2] == 'R') {
+            changes.push_back({-1, {}});
+            i = esc + 3;
+            continue;
+        }
+        if (in[esc + 1] == ']' && in[esc + 2] == 'P') {
+            int digits[7];
+            bool hex = true;
+            for (int k = 0; k < 7; ++k) hex = hex && (digits[k] = HexDigit(in[esc + 3 + k])) >= 0;
+            if (hex) {
+                changes.push_back({digits[0],
+                                   {uint8_t(digits[1] * 16 + digits[2]), uint8_t(digits[3] * 16 + digits[4]),
+                                    uint8_t(digits[5] * 16 + digits[6])}});
+                i = esc + 10;
+                continue;
+            }
+        }
+        out += '\x1b';
+        i = esc + 1;
+    }
+    return out;
+}
+
+bool ParsePaletteOsc(std::string_view body, std::vector<PaletteChange>& changes) {
+    std::vector<std::string_view> parts;
+    for (size_t start = 0;;) {
+        size_t semi = body.find(';', start);
+        parts.push_back(body.substr(start, semi == std::string_view::npos ? semi : semi - start));
+        if (semi == std::string_view::npos) break;
+        start = semi + 1;
+    }
+    if (parts.size() < 3 || parts.size() % 2 == 0 || parts[0] != "4") return false;
+    std::vector<PaletteChange> found;
+    for (size_t p = 1; p + 1 < parts.size(); p += 2) {
+        int index = 0;
+        if (parts[p].empty()) return false;
+        for (char c : parts[p]) {
+            if (c < '0' || c > '9') return false;
+            index = index * 10 + (c - '0');
+        }
+        std::string_view spec = parts[p + 1];
+        if (spec.substr(0, 4) != "rgb:") return false;
+        spec.remove_prefix(4);
+        uint8_t rgb[3];
+        for (int k = 0; k < 3; ++k) {
+            size_t slash = spec.find('/');
+            std::string_view comp = spec.substr(0, slash);
+            if (comp.empty() || comp.size() > 4 || (k < 2) == (slash == std::string_view::npos)) return false;
+            unsigned value = 0;
+            for (char c : comp) {
+                int d = HexDigit(c);
+                if (d < 0) return false;
+                value = value * 16 + unsigned(d);
+            }
+            const unsigned max = (1u << (4 * comp.size())) - 1;
+            rgb[k] = uint8_t((value * 255 + max / 2) / max);
+            spec.remove_prefix(slash == std::string_view::npos ? spec.size() : slash + 1);
+        }
+        found.push_back({index, {rgb[0], rgb[1], rgb[2]}});
+    }
+    changes.insert(changes.end(), found.begin(), found.end());
+    return true;
+}
+
+Terminal::Terminal(TerminalOptions options)
+    : _options(std::move(options)), _cols(_options.cols), _rows(_options.rows) {
+    _vt = vterm_new(_rows, _cols);
+    vterm_set_utf8(_vt, 1);
+    vterm_output_set_callback(_vt, &Terminal::OnOutput, this);
+    _screen = vterm_obtain_screen(_vt);
+    vterm_screen_enable_altscreen(_screen, 1);
+    vterm_screen_reset(_screen, 1);
+    static const VTermParserCallbacks fallbacks = {.osc = &Terminal::OnOsc};
+    vterm_screen_set_unrecognised_fallbacks(_screen, &fallbacks, this);
+
+    // Everything the child needs is built before the fork.
+    std::vector<std::string> envStrings{"TERM=" + _options.term};
+    envStrings.insert(envStrings.end(), _options.env.begin(), _options.env.end());
+    std::vector<char*> envp;
+    for (auto& e : envStrings) envp.push_back(e.data());
+    envp.push_back(nullptr);
+    std::vector<char*> argv{_options.program.data()};
+    for (auto& a : _options.args) argv.push_back(a.data());
+    argv.push_back(nullptr);
+
+    struct winsize ws = {};
+    ws.ws_row = static_cast<unsigned short>(_rows);
+    ws.ws_col = static_cast<unsigned short>(_cols);
+    _lastOutput = Clock::now();
+    _pid = forkpty(&_master, nullptr, nullptr, &ws);
+    if (_pid < 0) {
+        vterm_free(_vt);
+        throw std::runtime_error(std::string("forkpty failed: ") + strerror(errno));
+    }
+    if (_pid == 0) {
+        sigset_t none;
+        sigemptyset(&none);
+        sigprocmask(SIG_SETMASK, &none, nullptr);
+        signal(SIGPIPE, SIG_DFL);
+        execve(argv[0], argv.data(), envp.data());
+        _exit(127);
+    }
+    fcntl(_master, F_SETFD, FD_CLOEXEC);
+    _reader = std::thread([this] { ReaderLoop(); });
+}
+
+Terminal::~Terminal() {
+    if (!_status) {
+        // The program is a session leader: its group holds whatever it started.
+        kill(-_pid, SIGKILL);
+        kill(_pid, SIGKILL);
+        Reap(0);
+    }
+    {
+        std::lock_guard lock(_mutex);
+        _stop = true;
+    }
+    _reader.join();
+    close(_master);
+    vterm_free(_vt);
+}
+
+void Terminal::ReaderLoop() {
+    char buf[65536];
+    for (;;) {
+        {
+            std::lock_guard lock(_mutex);
+            if (_stop) return;
+        }
+        struct pollfd p = {_master, POLLIN, 0};
+        int r = poll(&p, 1, 20);
+        if (r <= 0) continue;
+        ssize_t n = read(_master, buf, sizeof buf);
+        if (n < 0 && (errno == EINTR || errno == EAGAIN)) continue;
+        std::lock_guard lock(_mutex);
+        if (n > 0) {
+            Feed(buf, size_t(n));
+        } else {
+            // EIO: every holder of the slave side has closed it.
+            _eof = true;
+        }
+        _changed.notify_all();
+        if (_eof) return;
+    }
+}
+
+void Terminal::Feed(const char* data, size_t size) {
+    _bytes += size;
+    _lastOutput = Clock::now();
+    std::string pass = _filter.Feed(std::string_view(data, size), _palette);
+    if (!pass.empty()) vterm_input_write(_vt, pass.data(), pass.size());
+}
+
+void Terminal::OnOutput(const char* bytes, size_t len, void* user) {
+    // Answers of the emulated terminal (cursor reports and the like).
+    auto* self = static_cast<Terminal*>(user);
+    while (len > 0) {
+        ssize_t n = write(self->_master, bytes, len);
+        if (n < 0 && errno == EINTR) continue;
+        if (n <= 0) return;
+        bytes += n;
+        len -= size_t(n);
+    }
+}
+
+int Terminal::OnOsc(const char* command, size_t len, void* user) {
+    auto* self = static_cast<Terminal*>(user);
+    return ParsePaletteOsc(std::string_view(command, len), self->_palette) ? 1 : 0;
+}
+
+int Terminal::Cols() const {
+    std::lock_guard lock(_mutex);
+    return _cols;
+}
+
+int Terminal::Rows() const {
+    std::lock_guard lock(_mutex);
+    return _rows;
+}
+
+void Terminal::Send(std::string_view bytes) {
+    while (!bytes.empty()) {
+        ssize_t n = write(_master, bytes.data(), bytes.size());
+        if (n < 0 && errno == EINTR) continue;
+        if (n <= 0) {
+            ADD_FAILURE() << "writing to the terminal failed: " << strerror(errno);
+            return;
+        }
+        bytes.remove_prefix(size_t(n));
+    }
+}
+
+void Terminal::SendKey(std::string_view name) {
+    static const std::map<std::string, std::string, std::less<>> literal = {
+        {"Enter", "\r"}, {"Esc", "\x1b"}, {"Tab", "\t"}};
+    static const std::map<std::string, std::string, std::less<>> capability = {
+        {"Up", "kcuu1"},     {"Down", "kcud1"},   {"Left", "kcub1"},   {"Right", "kcuf1"},
+        {"Home", "khome"},   {"End", "kend"},     {"PageUp", "kpp"},   {"PageDown", "knp"},
+        {"Insert", "kich1"}, {"Delete", "kdch1"}, {"Backspace", "kbs"}};
+    if (auto it = literal.find(name); it != literal.end()) return Send(it->second);
+    std::string cap;
+    if (auto it = capability.find(name); it != capability.end()) {
+        cap = it->second;
+    } else if (name.size() >= 2 && name[0] == 'F') {
+        cap = "kf" + std::string(name.substr(1));
+    } else {
+        ADD_FAILURE() << "unknown key name " << name;
+        return;
+    }
+    std::string bytes = TerminfoString(_options.term, cap);
+    if (bytes.empty()) {
+        ADD_FAILURE() << "TERM=" << _options.term << " has no key " << name << " (" << cap << ")";
+        return;
+    }
+    Send(bytes);
+}
+
+void Terminal::Signal(int sig) {
+    if (kill(_pid, sig) != 0) ADD_FAILURE() << "kill(" << _pid << ", " << sig << "): " << strerror(errno);
+}
+
+void Terminal::Resize(int cols, int rows) {
+    {
+        std::lock_guard lock(_mutex);
+        vterm_set_size(_vt, rows, cols);
+        _cols = cols;
+        _rows = rows;
+    }
+    struct winsize ws = {};
+    ws.ws_row = static_cast<unsigned short>(rows);
+    ws.ws_col = static_cast<unsigned short>(cols);
+    if (ioctl(_master, TIOCSWINSZ, &ws) != 0) ADD_FAILURE() << "TIOCSWINSZ: " << strerror(errno);
+}
+
+struct termios Terminal::Modes() const {
+    struct termios modes = {};
+    if (tcgetattr(_master, &modes) != 0) ADD_FAILURE() << "tcgetattr: " << strerror(errno);
+    return modes;
+}
+
+::testing::AssertionResult Terminal::WaitForText(std::string_view text, Duration timeout) {
+    const auto deadline = Clock::now() + timeout;
+    {
+        std::unique_lock lock(_mutex);
+        while (!FindLocked(text)) {
+            if (_eof || _changed.wait_until(lock, deadline) == std::cv_status::timeout) {
+                if (FindLocked(text)) break;
+                return ::testing::AssertionFailure()
+                       << "\"" << text << "\" not on the screen"
+                       << (_eof ? " (the program closed the terminal)"
+                                : " after " + std::to_string(timeout.count()) + " ms")
+                       << "\n"
+                       << DumpLocked(false);
+            }
+        }
+    }
+    return WaitQuiet(kQuiet, timeout);
+}
+
+::testing::AssertionResult Terminal::WaitForTextGone(std::string_view text, Duration timeout) {
+    const auto deadline = Clock::now() + timeout;
+    {
+        std::unique_lock lock(_mutex);
+        while (FindLocked(text)) {
+            if (_eof || _changed.wait_until(lock, deadline) == std::cv_status::timeout) {
+                if (!FindLocked(text)) break;
+                return ::testing::AssertionFailure() << "\"" << text << "\" still on the screen\n"
+                                                     << DumpLocked(false);
+            }
+        }
+    }
+    return WaitQuiet(kQuiet, timeout);
+}
+
+::testing::AssertionResult Terminal::WaitQuiet(Duration quiet, Duration timeout) {
+    const auto start = Clock::now();
+    const auto deadline = start + timeout;
+    std::unique_lock lock(_mutex);
+    for (;;) {
+        const auto now = Clock::now();
+        // The quiet period starts now at the earliest: a check that nothing
+        // happens after an action always gives the program that long.
+        const auto quietUntil = std::max(_lastOutput, start) + quiet;
+        if (_eof || now >= quietUntil) return ::testing::AssertionSuccess();
+        if (now >= deadline) {
+            return ::testing::AssertionFailure() << "the program did not go quiet for " << quiet.count()
+                                                 << " ms within " << timeout.count() << " ms\n"
+                                                 << DumpLocked(false);
+        }
+        _changed.wait_until(lock, std::min(quietUntil, deadline));
+    }
+}
+
+bool Terminal::Reap(int options) {
+    if (_status) return true;
+    int st = 0;
+    pid_t r;
+    do {
+        r = waitpid(_pid, &st, options);
+    } while (r < 0 && errno == EINTR);
+    if (r == _pid) _status = st;
+    return _status.has_value();
+}
+
+bool Terminal::HasExited() { return Reap(WNOHANG); }
+
+std::optional<int> Terminal::WaitForExit(Duration timeout) {
+    const auto deadline = Clock::now() + timeout;
+    while (!Reap(WNOHANG)) {
+        if (Clock::now() >= deadline) return std::nullopt;
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    }
+    // Let the reader take in the last output; the slave side closes with the
+    // program unless something it started keeps it open.
+    std::unique_lock lock(_mutex);
+    _changed.wait_for(lock, std::chrono::milliseconds(500), [this] { return _eof; });
+    return _status;
+}
+
+::testing::AssertionResult Terminal::ExitsWith(int code, Duration timeout) {
+    std::optional<int> status = WaitForExit(timeout);
+    if (status && WIFEXITED(*status) && WEXITSTATUS(*status) == code) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure()
+           << "expected exit " << code << ", got " << DescribeStatus(status)
+           << (status ? "" : " after " + std::to_string(timeout.count()) + " ms") << "\n"
+           << Dump();
+}
+
+std::string Terminal::DescribeStatus(std::optional<int> status) {
+    if (!status) return "running";
+    if (WIFEXITED(*status)) return "exit " + std::to_string(WEXITSTATUS(*status));
+    if (WIFSIGNALED(*status)) return "signal " + std::to_string(WTERMSIG(*status));
+    return "status " + std::to_string(*status);
+}
+
+Cell Terminal::CellLocked(int col, int row) const {
+    Cell cell;
+    VTermScreenCell c;
+    if (col < 0 || row < 0 || col >= _cols || row >= _rows ||
+        !vterm_screen_get_cell(_screen, VTermPos{row, col}, &c)) {
+        return cell;
+    }
+    if (c.chars[0] == 0) {
+        cell.text = " ";
+    } else if (c.chars[0] != uint32_t(-1)) {  // -1 marks the right half of a wide character
+        for (int i = 0; i < VTERM_MAX_CHARS_PER_CELL && c.chars[i]; ++i) AppendUtf8(cell.text, c.chars[i]);
+    }
+    cell.fg = ToCellColor(c.fg, true);
+    cell.bg = ToCellColor(c.bg, false);
+    cell.bold = c.attrs.bold;
+    cell.underline = c.attrs.underline != 0;
+    cell.blink = c.attrs.blink;
+    cell.reverse = c.attrs.reverse;
+    return cell;
+}
+
+Cell Terminal::CellAt(int col, int row) const {
+    std::lock_guard lock(_mutex);
+    return CellLocked(col, row);
+}
+
+std::string Terminal::RowLocked(int row) const {
+    std::string text;
+    for (int col = 0; col < _cols; ++col) text += CellLocked(col, row).text;
+    return text;
+}
+
+std::string Terminal::RowText(int row) const {
+    std::lock_guard lock(_mutex);
+    return RowLocked(row);
+}
+
+std::string Terminal::RowTextTrimmed(int row) const {
+    std::string text = RowText(row);
+    text.erase(text.find_last_not_of(' ') + 1);
+    return text;
+}
+
+std::string Terminal::RegionText(int col, int row, int width, int height) const {
+    std::lock_guard lock(_mutex);
+    std::string joined;
+    for (int r = row; r < row + height && r < _rows; ++r) {
+        std::string line;
+        for (int c = col; c < col + width && c < _cols; ++c) line += CellLocked(c, r).text;
+        line = Trim(line);
+        if (line.empty()) continue;
+        if (!joined.empty()) joined += ' ';
+        joined += line;
+    }
+    return joined;
+}
+
+std::string Terminal::ScreenText() const {
+    std::lock_guard lock(_mutex);
+    std::string text;
+    for (int row = 0; row < _rows; ++row) {
+        if (row) text += '\n';
+        text += RowLocked(row);
+    }
+    return text;
+}
+
+std::optional<Pos> Terminal::FindLocked(std::string_view text) const {
+    for (int row = 0; row < _rows; ++row) {
+        // Byte offset of each cell, to turn a match into a column.
+        std::string line;
+        std::vector<size_t> starts;
+        for (int col = 0; col < _cols; ++col) {
+            starts.push_back(line.size());
+            line += CellLocked(col, row).text;
+        }
+        size_t at = line.find(text);
+        if (at == std::string::npos) continue;
+        int col = 0;
+        while (col + 1 < _cols && starts[size_t(col) + 1] <= at) ++col;
+        return Pos{col, row};
+    }
+    return std::nullopt;
+}
+
+::testing::AssertionResult Terminal::HasTextAt(int col, int row, std::string_view text) const {
+    std::lock_guard lock(_mutex);
+    std::string line;
+    for (int c = col; c < _cols; ++c) line += CellLocked(c, row).text;
+    if (line.compare(0, text.size(), text) == 0) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure() << "row " << row << " from column " << col << " reads \"" << line
+                                         << "\", expected \"" << text << "\"\n"
+                                         << DumpLocked(false);
+}
+
+std::optional<Pos> Terminal::Find(std::string_view text) const {
+    std::lock_guard lock(_mutex);
+    return FindLocked(text);
+}
+
+std::vector<Pos> Terminal::FindAll(std::string_view text) const {
+    std::lock_guard lock(_mutex);
+    std::vector<Pos> found;
+    if (text.empty()) return found;
+    for (int row = 0; row < _rows; ++row) {
+        std::string line;
+        std::vector<size_t> starts;
+        for (int col = 0; col < _cols; ++col) {
+            starts.push_back(line.size());
+            line += CellLocked(col, row).text;
+        }
+        for (size_t at = line.find(text); at != std::string::npos; at = line.find(text, at + text.size())) {
+            int col = 0;
+            while (col + 1 < _cols && starts[size_t(col) + 1] <= at) ++col;
+            found.push_back({col, row});
+        }
+    }
+    return found;
+}
+
+std::string Terminal::DumpLocked(bool colors) const {
+    std::string out =
+        "screen " + std::to_string(_cols) + "x" + std::to_string(_rows) + ", TERM=" + _options.term + ", " +
+        std::to_string(_bytes) + " bytes received" +
+        (colors ? "; colours: . default, 0-f index, + higher index, # RGB; attributes: r reverse, "
+                  "b bold, u underline"
+                : "") +
+        "\n";
+    char num[16];
+    for (int row = 0; row < _rows; ++row) {
+        snprintf(num, sizeof num, "%3d|", row);
+        out += num + RowLocked(row) + "|\n";
+        if (!colors) continue;
+        std::string fg = " fg|", bg = " bg|", at = " at|";
+        bool anyAttr = false;
+        for (int col = 0; col < _cols; ++col) {
+            Cell cell = CellLocked(col, row);
+            fg += ColorChar(cell.fg);
+            bg += ColorChar(cell.bg);
+            char a = cell.reverse ? 'r' : cell.bold ? 'b' : cell.underline ? 'u' : '.';
+            anyAttr = anyAttr || a != '.';
+            at += a;
+        }
+        out += fg + "|\n" + bg + "|\n";
+        if (anyAttr) out += at + "|\n";
+    }
+    return out;
+}
+
+std::string Terminal::Dump(bool colors) const {
+    std::lock_guard lock(_mutex);
+    return DumpLocked(colors);
+}
+
+std::vector<PaletteChange> Terminal::PaletteLog() const {
+    std::lock_guard lock(_mutex);
+    return _palette;
+}
+
+std::optional<Rgb> Terminal::PaletteColor(int index) const {
+    std::lock_guard lock(_mutex);
+    for (auto it = _palette.rbegin(); it != _palette.rend(); ++it) {
+        if (it->index == -1) break;
+        if (it->index == index) return it->rgb;
+    }
+    return std::nullopt;
+}
+
+size_t Terminal::BytesReceived() const {
+    std::lock_guard lock(_mutex);
+    return _bytes;
+}
+
+}  // namespace E2e

@@ -1,0 +1,416 @@
+// The welcome screen of the real console: layout and colours on the local
+// console and on serial terminals, the host's values, and how it follows
+// changes of the host after the refresh signal.
+#include <signal.h>
+
+#include <cstring>
+#include <functional>
+#include <thread>
+
+#include "SimHost.hpp"
+#include "Terminal.hpp"
+
+namespace E2e {
+namespace {
+
+using nlohmann::json;
+
+const char kTitle[] = "Tarni 8.0.2 (QELKernel 8.0.2 Build releasebuild-22380479)";
+const char kFooterLeft[] = "<F2> Customize System/View Logs";
+const char kFooterRight[] = "<F12> Shut Down/Restart";
+const char kNoAdapter[] =
+    "No compatible network adapter found. Please consult the product's Hardware Compatibility Guide (HCG) "
+    "for "
+    "a list of supported adapters.";
+
+// The welcome screen is complete once its footer is drawn and output pauses.
+::testing::AssertionResult WaitForWelcome(Terminal& t) { return t.WaitForText("Shut Down/Restart"); }
+
+// Where the console puts things: the upper half has LINES/2 rows, the lower
+// half the rest, the network text starts on the lower half's second row.
+struct Layout {
+    int cols, rows;
+    int Upper() const { return rows / 2; }
+    int NetworkRow() const { return Upper() + 1; }
+    int WarningRow() const { return Upper() + 9; }
+    int FooterRow() const { return rows - 2; }
+};
+
+std::string NetworkText(const Terminal& t) {
+    Layout l{t.Cols(), t.Rows()};
+    return t.RegionText(8, l.NetworkRow(), l.cols - 16, 7);
+}
+
+std::string WarningText(const Terminal& t) {
+    Layout l{t.Cols(), t.Rows()};
+    return t.RegionText(16, l.WarningRow(), l.cols - 32, 6);
+}
+
+struct ScreenCase {
+    const char* term;
+    int cols, rows;
+    bool color;  // false: black/white mode (the terminal cannot redefine colours)
+};
+void PrintTo(const ScreenCase& c, std::ostream* os) {
+    *os << "TERM=" << c.term << " " << c.cols << "x" << c.rows;
+}
+
+class WelcomeLayoutTest : public ::testing::TestWithParam<ScreenCase> {};
+
+TEST_P(WelcomeLayoutTest, TextsInTheirPlaces) {
+    const ScreenCase& p = GetParam();
+    SimHost host;
+    Terminal t(host.Console(p.term, p.cols, p.rows));
+    ASSERT_TRUE(WaitForWelcome(t));
+    const Layout l{p.cols, p.rows};
+
+    EXPECT_TRUE(t.HasTextAt(8, 5, std::string(kTitle) + "   "));
+    EXPECT_TRUE(t.HasTextAt(8, 7, "Acme Server 9   "));
+    EXPECT_TRUE(t.HasTextAt(8, 9, "2 x Acme Processor A9-2400 @ 2.40GHz   "));
+    EXPECT_TRUE(t.HasTextAt(8, 10, "16 GiB Memory   "));
+    EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow(), "Download tools to manage this host from:   "));
+    EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 1, "http://host1/   "));
+    EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 2, "http://192.168.10.21/ (DHCP)   "));
+    EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 3, "http://[fe80::250:56ff:fe01:2]/ (AUTOCONF)   "));
+    EXPECT_EQ(NetworkText(t),
+              "Download tools to manage this host from: http://host1/ http://192.168.10.21/ (DHCP) "
+              "http://[fe80::250:56ff:fe01:2]/ (AUTOCONF)");
+    EXPECT_EQ(WarningText(t), "");
+
+    // Footer: left part at column 2, right part ending at column COLS-3.
+    EXPECT_TRUE(t.HasTextAt(2, l.FooterRow(), kFooterLeft));
+    EXPECT_TRUE(
+        t.HasTextAt(l.cols - 2 - int(strlen(kFooterRight)), l.FooterRow(), std::string(kFooterRight) + " "));
+    EXPECT_EQ(t.FindAll("<F2>").size(), 1u);
+
+    // A box around the whole screen.
+    EXPECT_EQ(t.CellAt(0, 0).text, "┌") << t.Dump();
+    EXPECT_EQ(t.CellAt(l.cols - 1, 0).text, "┐");
+    EXPECT_EQ(t.CellAt(0, l.rows - 1).text, "└");
+    EXPECT_EQ(t.CellAt(l.cols - 1, l.rows - 1).text, "┘");
+    EXPECT_EQ(t.CellAt(0, l.rows / 2).text, "│");
+}
+
+TEST_P(WelcomeLayoutTest, UpperHalfDarkGreyLowerHalfYellow) {
+    const ScreenCase& p = GetParam();
+    SimHost host;
+    Terminal t(host.Console(p.term, p.cols, p.rows));
+    ASSERT_TRUE(WaitForWelcome(t));
+    const Layout l{p.cols, p.rows};
+
+    // Every cell inside the box belongs to one of the halves; with an odd
+    // number of rows the lower half has the extra row.
+    int wrong = 0;
+    for (int row = 1; row < l.rows - 1 && wrong < 5; ++row) {
+        const bool upper = row < l.Upper();
+        for (int col = 1; col < l.cols - 1 && wrong < 5; ++col) {
+            const Cell cell = t.CellAt(col, row);
+            const bool ok = p.color
+                                ? cell.bg.IsIndex(upper ? 6 : 3) && !cell.reverse
+                                : cell.bg == CellColor{} && cell.fg == CellColor{} && cell.reverse == upper;
+            if (!ok) {
+                ++wrong;
+                ADD_FAILURE() << "cell " << col << "," << row << " (" << (upper ? "upper" : "lower")
+                              << " half): fg " << ToString(cell.fg) << ", bg " << ToString(cell.bg)
+                              << (cell.reverse ? ", reverse" : "");
+            }
+        }
+    }
+    if (wrong) ADD_FAILURE() << t.Dump(true);
+
+    if (p.color) {
+        struct Expect {
+            const char* what;
+            Pos pos;
+            int fg, bg;
+        };
+        const Expect texts[] = {
+            {"title", {8, 5}, 7, 6},
+            {"memory", {8, 10}, 7, 6},
+            {"network", {8, l.NetworkRow()}, 0, 3},
+            {"<F2>", {2, l.FooterRow()}, 0, 3},
+            {"Customize", {7, l.FooterRow()}, 6, 3},
+            {"<F12>", {l.cols - 25, l.FooterRow()}, 0, 3},
+            {"Shut Down", {l.cols - 19, l.FooterRow()}, 6, 3},
+        };
+        for (const auto& e : texts) {
+            const Cell cell = t.CellAt(e.pos.col, e.pos.row);
+            EXPECT_TRUE(cell.fg.IsIndex(e.fg) && cell.bg.IsIndex(e.bg))
+                << e.what << " at " << e.pos.col << "," << e.pos.row << " \"" << cell.text << "\": fg "
+                << ToString(cell.fg) << ", bg " << ToString(cell.bg) << ", expected " << e.fg << " on "
+                << e.bg;
+        }
+        // The redefined colours, 0..1000 scaled to 8 bits as terminfo does.
+        const std::pair<int, Rgb> palette[] = {{3, {254, 204, 0}},
+                                               {6, {84, 84, 84}},
+                                               {2, {169, 169, 169}},
+                                               {7, {254, 254, 254}},
+                                               {1, {254, 0, 0}}};
+        for (const auto& [index, rgb] : palette) {
+            std::optional<Rgb> got = t.PaletteColor(index);
+            EXPECT_TRUE(got && *got == rgb)
+                << "colour " << index << " is " << (got ? ToString(*got) : std::string("not redefined"))
+                << ", expected " << ToString(rgb);
+        }
+        EXPECT_EQ(t.PaletteColor(0), std::nullopt) << "colour 0 keeps its definition";
+    } else {
+        EXPECT_TRUE(t.PaletteLog().empty())
+            << t.PaletteLog().size() << " palette changes in black/white mode";
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Terms, WelcomeLayoutTest,
+    ::testing::Values(ScreenCase{"linux", 80, 25, true}, ScreenCase{"linux", 80, 24, true},
+                      ScreenCase{"linux", 100, 31, true}, ScreenCase{"xterm-256color", 80, 25, true},
+                      ScreenCase{"xterm", 80, 25, false}, ScreenCase{"vt100", 80, 24, false},
+                      ScreenCase{"vt100", 100, 31, false}),
+    [](const auto& info) {
+        std::string name = std::string(info.param.term) + "_" + std::to_string(info.param.cols) + "x" +
+                           std::to_string(info.param.rows);
+        for (char& c : name)
+            if (c == '-') c = '_';
+        return name;
+    });
+
+json Ipv6(const std::string& address, const std::string& type) {
+    return {{"address", address}, {"prefix", 64}, {"type", type}};
+}
+
+json Ipv6List(int count) {
+    json list = json::array();
+    for (int i = 1; i <= count; ++i) list.push_back(Ipv6("2001:db8::" + std::to_string(i), "static"));
+    return list;
+}
+
+// A change of the host while the console shows the welcome screen, followed
+// by the refresh signal.
+struct ValueCase {
+    const char* name;
+    std::vector<std::pair<std::string, json>> changes;  // JSON pointer, new value
+    std::optional<std::string> network;                 // the network text, rows joined
+    std::vector<std::string> shown;                     // each on one row
+    std::vector<std::string> hidden;
+    std::optional<std::string> warning;
+    int rows = 25;  // the warning area needs a tall screen to be seen whole
+};
+void PrintTo(const ValueCase& c, std::ostream* os) { *os << c.name; }
+
+const std::string kDownload = "Download tools to manage this host from:";
+const std::string kLinkLocal = "http://[fe80::250:56ff:fe01:2]/ (AUTOCONF)";
+
+const ValueCase kValueCases[] = {
+    {"StaticAddress",
+     {{"/network/vnics/0/ipv4/address", "10.0.0.7"}, {"/network/vnics/0/ipv4/dhcp", false}},
+     kDownload + " http://host1/ http://10.0.0.7/ (STATIC) " + kLinkLocal,
+     {"http://10.0.0.7/ (STATIC)"},
+     {"192.168.10.21", "(DHCP)"}},
+    {"Ipv4Off",
+     {{"/network/vnics/0/ipv4/none", true}},
+     kDownload + " http://host1/ " + kLinkLocal,
+     {},
+     {"http://192.168.10.21/"}},
+    {"NewHostName",
+     {{"/network/dns/hostname", "lab-07"}},
+     kDownload + " http://lab-07/ http://192.168.10.21/ (DHCP) " + kLinkLocal},
+    {"LocalhostNotLinked",
+     {{"/network/dns/hostname", "localhost"}},
+     kDownload + " http://192.168.10.21/ (DHCP) " + kLinkLocal,
+     {},
+     {"http://localhost", "http://host1"}},
+    {"EmptyHostNameNotLinked",
+     {{"/network/dns/hostname", ""}},
+     kDownload + " http://192.168.10.21/ (DHCP) " + kLinkLocal,
+     {},
+     {"http:///"}},
+    {"WaitingForDhcp",
+     {{"/network/vnics/0/ipv4/address", "0.0.0.0"}},
+     std::nullopt,
+     {"Waiting for DHCP..."},
+     {"http://192.168.10.21/"},
+     "Warning: DHCP lookup failed. You may be unable to access this system until you customize its network "
+     "configuration.",
+     40},
+    {"AuditMode",
+     {{"/system/bootOptions/auditMode", true}},
+     std::nullopt,
+     {},
+     {},
+     "Warning: Host is running in audit mode. Your configuration will not be persistent across reboots. "
+     "Please "
+     "contact support.",
+     40},
+    {"Ipv6Origins",
+     {{"/network/vnics/0/ipv6/addresses",
+       json::array(
+           {Ipv6("2001:db8::5", "static"), Ipv6("2001:db8::6", "dhcp"), Ipv6("fe80::1", "autoconf")})}},
+     kDownload + " http://host1/ http://192.168.10.21/ (DHCP) http://[2001:db8::5]/ (STATIC) "
+                 "http://[2001:db8::6]/ (DHCP) "
+                 "http://[fe80::1]/ (AUTOCONF)",
+     {"http://[2001:db8::5]/ (STATIC)", "http://[2001:db8::6]/ (DHCP)", "http://[fe80::1]/ (AUTOCONF)"}},
+    {"FiveIpv6AllListed",
+     {{"/network/dns/hostname", "localhost"}, {"/network/vnics/0/ipv6/addresses", Ipv6List(5)}},
+     kDownload +
+         " http://192.168.10.21/ (DHCP) http://[2001:db8::1]/ (STATIC) http://[2001:db8::2]/ (STATIC) "
+         "http://[2001:db8::3]/ (STATIC) http://[2001:db8::4]/ (STATIC) http://[2001:db8::5]/ (STATIC)",
+     {},
+     {"..."}},
+    {"SixIpv6FourListed",
+     {{"/network/dns/hostname", "localhost"}, {"/network/vnics/0/ipv6/addresses", Ipv6List(6)}},
+     kDownload +
+         " http://192.168.10.21/ (DHCP) http://[2001:db8::1]/ (STATIC) http://[2001:db8::2]/ (STATIC) "
+         "http://[2001:db8::3]/ (STATIC) http://[2001:db8::4]/ (STATIC) ...",
+     {},
+     {"2001:db8::5", "2001:db8::6"}},
+    {"Ipv6Disabled",
+     {{"/network/ipv6Enabled", false}},
+     kDownload + " http://host1/ http://192.168.10.21/ (DHCP)",
+     {},
+     {"http://["}},
+    {"NoAdapters", {{"/network/pnics", json::array()}}, kNoAdapter, {}, {"http://", kDownload}},
+    {"VendorPutInFront", {{"/hardware/product", "Server by Acme"}}, std::nullopt, {"Acme Server by Acme"}},
+    {"OnePackage",
+     {{"/hardware/cpu/packages", 1}},
+     std::nullopt,
+     {"Acme Processor A9-2400 @ 2.40GHz"},
+     {"x Acme Processor"}},
+    {"MemoryRoundedUpWithOneDecimal",  // 6300 MiB, rounded up to 6400 MiB
+     {{"/hardware/memory/totalPages", 6300 * 256}},
+     std::nullopt,
+     {"6.2 GiB Memory"},
+     {"16 GiB Memory"}},
+    {"MemoryWhole",
+     {{"/hardware/memory/totalPages", 8192 * 256}},
+     std::nullopt,
+     {"8 GiB Memory"},
+     {"8.0 GiB"}},
+    {"MemoryTebibytes",
+     {{"/hardware/memory/totalPages", 1536LL * 1024 * 256}},
+     std::nullopt,
+     {"1.5 TiB Memory"},
+     {"GiB Memory"}},
+};
+
+class WelcomeValuesTest : public ::testing::TestWithParam<ValueCase> {};
+
+TEST_P(WelcomeValuesTest, ShownAfterRefreshSignal) {
+    const ValueCase& c = GetParam();
+    SimHost host;
+    Terminal t(host.Console("linux", 80, c.rows));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(t.Contains("http://192.168.10.21/ (DHCP)"));
+    for (const auto& [pointer, value] : c.changes) host.Set(pointer, value);
+    t.Signal(SIGUSR1);
+    auto matches = [&] {
+        if (c.network && NetworkText(t) != *c.network) return false;
+        if (c.warning && WarningText(t) != *c.warning) return false;
+        for (const auto& text : c.shown)
+            if (!t.Contains(text)) return false;
+        for (const auto& text : c.hidden)
+            if (t.Contains(text)) return false;
+        return true;
+    };
+    const auto deadline = std::chrono::steady_clock::now() + kDefaultTimeout;
+    while (!matches() && std::chrono::steady_clock::now() < deadline)
+        std::this_thread::sleep_for(Duration(10));
+    ASSERT_TRUE(t.WaitQuiet());
+    if (c.network) {
+        EXPECT_EQ(NetworkText(t), *c.network) << t.Dump();
+    }
+    for (const auto& text : c.shown) EXPECT_TRUE(t.Contains(text)) << text << "\n" << t.Dump();
+    for (const auto& text : c.hidden) EXPECT_FALSE(t.Contains(text)) << text << "\n" << t.Dump();
+    if (c.warning) {
+        EXPECT_EQ(WarningText(t), *c.warning) << t.Dump();
+    }
+    EXPECT_TRUE(t.Contains(kTitle)) << t.Dump();
+    EXPECT_FALSE(t.HasExited()) << "the refresh signal ended the console";
+}
+
+INSTANTIATE_TEST_SUITE_P(Changes, WelcomeValuesTest, ::testing::ValuesIn(kValueCases),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+TEST(WelcomeScreenTest, MissingAdapterAlertRaisedOncePerRun) {
+    SimHost host;
+    host.Set("/network/pnics", json::array());
+    Terminal t(host.Console());
+    ASSERT_TRUE(t.WaitForText("No compatible network adapter found."));
+    EXPECT_EQ(NetworkText(t), kNoAdapter) << t.Dump();
+    EXPECT_EQ(host.Get("/system/systemAlert"), "No compatible network adapter found.");
+
+    // Cleared by someone else: the next draws of this run leave it alone.
+    host.Set("/system/systemAlert", "");
+    t.Signal(SIGUSR1);
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    t.Signal(SIGUSR1);
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t.Contains("No compatible network adapter found.")) << t.Dump();
+    EXPECT_EQ(host.Get("/system/systemAlert"), "");
+
+    // An adapter appears: the normal network text is back.
+    host.Set("/network/pnics/0", {{"name", "zonic0"},
+                                  {"mac", "00:50:56:01:00:02"},
+                                  {"driver", "e1000e"},
+                                  {"linkUp", true},
+                                  {"speedMbps", 1000},
+                                  {"description", "Acme Gigabit Ethernet Controller"}});
+    t.Signal(SIGUSR1);
+    EXPECT_TRUE(t.WaitForText("http://192.168.10.21/ (DHCP)"));
+    EXPECT_FALSE(t.Contains("No compatible network adapter")) << t.Dump();
+}
+
+TEST(WelcomeScreenTest, AlertNotRaisedWithAdapters) {
+    SimHost host;
+    Terminal t(host.Console());
+    ASSERT_TRUE(WaitForWelcome(t));
+    t.Signal(SIGUSR1);
+    ASSERT_TRUE(t.WaitQuiet(Duration(200)));
+    EXPECT_EQ(host.Get("/system/systemAlert"), "");
+}
+
+TEST(WelcomeScreenTest, CustomWelcomeMessageReplacesEverything) {
+    SimHost host;
+    Terminal t(host.Console("linux", 80, 25));
+    ASSERT_TRUE(WaitForWelcome(t));
+    host.Set("/system/welcomeMessage", "Property of the lab.\nAsk Dana before rebooting.");
+    t.Signal(SIGUSR1);
+    ASSERT_TRUE(t.WaitForText("Property of the lab."));
+    EXPECT_EQ(t.Find("Property of the lab."), (Pos{2, 2}));
+    EXPECT_TRUE(t.HasTextAt(2, 3, "Ask Dana before rebooting."));
+    for (const char* gone : {"<F2>", "<F12>", "Download tools", "Tarni 8.0.2", "Acme Server 9", "GiB Memory"})
+        EXPECT_FALSE(t.Contains(gone)) << gone << "\n" << t.Dump();
+    EXPECT_EQ(t.CellAt(0, 0).text, "┌") << t.Dump();
+    EXPECT_EQ(t.CellAt(79, 24).text, "┘");
+
+    // Message removed: the standard layout comes back.
+    host.Set("/system/welcomeMessage", "");
+    t.Signal(SIGUSR1);
+    ASSERT_TRUE(t.WaitForText(kFooterRight));
+    EXPECT_FALSE(t.Contains("Property of the lab.")) << t.Dump();
+    EXPECT_TRUE(t.HasTextAt(8, 5, kTitle));
+    EXPECT_TRUE(t.CellAt(10, 3).bg.IsIndex(6)) << t.Dump(true);
+    EXPECT_TRUE(t.CellAt(10, 20).bg.IsIndex(3)) << t.Dump(true);
+}
+
+TEST(WelcomeScreenTest, CustomWelcomeMessageAtStart) {
+    SimHost host;
+    host.Set("/system/welcomeMessage", "Lab host 7");
+    Terminal t(host.Console("vt100", 80, 24));
+    ASSERT_TRUE(t.WaitForText("Lab host 7"));
+    EXPECT_EQ(t.Find("Lab host 7"), (Pos{2, 2}));
+    EXPECT_FALSE(t.Contains("Shut Down/Restart")) << t.Dump();
+}
+
+TEST(WelcomeScreenTest, OtherKeysAreIgnored) {
+    SimHost host;
+    Terminal t(host.Console());
+    ASSERT_TRUE(WaitForWelcome(t));
+    const std::string before = t.ScreenText();
+    for (const char* key : {"Enter", "Up", "Down", "Tab", "F1", "F3", "F5", "F10"}) t.SendKey(key);
+    t.Send("xq 1");
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_FALSE(t.HasExited());
+    EXPECT_EQ(t.ScreenText(), before) << t.Dump();
+}
+
+}  // namespace
+}  // namespace E2e

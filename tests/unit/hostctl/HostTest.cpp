@@ -1,0 +1,204 @@
+// The choice of host, host path mapping and the syslog lines of a simulated
+// host.
+#include <sys/wait.h>
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <regex>
+
+#include "TestSupport.hpp"
+#include "hostctl/Backend.hpp"
+
+namespace {
+
+using namespace HostCtlTest;
+using HostCtl::Lib::HostPath;
+using HostCtl::Lib::HostRoot;
+using HostCtl::Lib::Syslog;
+
+class HostTest : public SimHostTest {
+protected:
+    std::string LogPath() const { return Root() + "/var/log/syslog.log"; }
+    std::string Log() const { return ReadFile(LogPath()); }
+};
+
+TEST_F(HostTest, HostPathMapsAbsolutePathsIntoTheRoot) {
+    EXPECT_TRUE(HostCtl::Lib::IsSimulatedHost());
+    EXPECT_EQ(HostRoot(), Root());
+    EXPECT_EQ(HostPath("/bin/hrm-cmd"), Root() + "/bin/hrm-cmd");
+    EXPECT_EQ(HostPath("/var/run/velk.pid"), Root() + "/var/run/velk.pid");
+    EXPECT_EQ(HostPath("/"), Root() + "/");
+    EXPECT_EQ(HostPath("relative/file"), "relative/file");
+    EXPECT_EQ(HostPath(""), "");
+
+    // The root is kept absolute and without a trailing slash.
+    HostCtl::Lib::UseSimulatedHost(Root() + "/");
+    EXPECT_EQ(HostPath("/etc/hosts"), Root() + "/etc/hosts");
+    const std::filesystem::path cwd = std::filesystem::current_path();
+    ASSERT_EQ(chdir(Root().c_str()), 0);
+    HostCtl::Lib::UseSimulatedHost("var/../var");
+    EXPECT_EQ(HostRoot(), Root() + "/var");
+    EXPECT_EQ(HostPath("/log/syslog.log"), Root() + "/var/log/syslog.log");
+    std::filesystem::current_path(cwd);
+}
+
+TEST_F(HostTest, SyslogAppendsFacilityAndLevel) {
+    HostCtl::Lib::OpenLog("VELK", LOG_PID, LOG_USER);
+    Syslog(LOG_INFO, "Setting hostname to %s", "esx1");
+    Syslog(LOG_AUTH | LOG_ERR, "Authentication for user %s failed", "root");
+    Syslog(LOG_AUTHPRIV | LOG_NOTICE, "%d%%", 42);
+    Syslog(LOG_DAEMON | LOG_WARNING, "w");
+    Syslog(LOG_LOCAL7 | LOG_DEBUG, "d");
+    Syslog(LOG_CRIT, "c");
+    HostCtl::Lib::OpenLog("other", 0, LOG_LOCAL3);
+    Syslog(LOG_INFO, "from local3");
+    Syslog(LOG_USER | LOG_INFO, "explicit user");
+    Syslog(LOG_INFO, "two\nlines\n");
+
+    const std::string pid = std::to_string(getpid());
+    const char* const expected[] = {
+        "VELK[#]: user.info: Setting hostname to esx1",
+        "VELK[#]: auth.err: Authentication for user root failed",
+        "VELK[#]: authpriv.notice: 42%",
+        "VELK[#]: daemon.warning: w",
+        "VELK[#]: local7.debug: d",
+        "VELK[#]: user.crit: c",
+        "other[#]: local3.info: from local3",
+        "other[#]: user.info: explicit user",
+        "other[#]: local3.info: two#012lines",
+    };
+    const std::regex stamp(R"(\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d\.\d{3}Z )");
+    std::istringstream log(Log());
+    std::string line;
+    for (const char* want : expected) {
+        ASSERT_TRUE(std::getline(log, line)) << "missing: " << want;
+        std::string text = want;
+        text.replace(text.find('#'), 1, pid);
+        std::smatch m;
+        ASSERT_TRUE(std::regex_search(line, m, stamp) && m.position(0) == 0) << line;
+        EXPECT_EQ(line.substr(size_t(m.length(0))), text);
+    }
+    EXPECT_FALSE(std::getline(log, line)) << "extra line: " << line;
+}
+
+TEST_F(HostTest, SyslogKeepsErrnoAndFormatsPercentM) {
+    HostCtl::Lib::OpenLog("VELK", 0, LOG_USER);
+    errno = EACCES;
+    Syslog(LOG_ERR, "open failed: %m");
+    EXPECT_EQ(errno, EACCES);
+    errno = ENOENT;
+    Syslog(LOG_ERR, "%s with errno(%d): %s", "open", errno, strerror(errno));
+    EXPECT_EQ(errno, ENOENT);
+    const std::string log = Log();
+    EXPECT_NE(log.find("user.err: open failed: Permission denied\n"), std::string::npos) << log;
+    EXPECT_NE(log.find("user.err: open with errno(2): No such file or directory\n"), std::string::npos)
+        << log;
+}
+
+TEST_F(HostTest, LongMessagesAreWrittenWhole) {
+    HostCtl::Lib::OpenLog("VELK", 0, LOG_USER);
+    const std::string big(5000, 'x');
+    Syslog(LOG_INFO, "<%s>", big.c_str());
+    EXPECT_NE(Log().find("user.info: <" + big + ">\n"), std::string::npos);
+}
+
+TEST_F(HostTest, SyslogWithoutLogFolderDoesNotFail) {
+    std::filesystem::remove_all(Root() + "/var/log");
+    errno = EINTR;
+    Syslog(LOG_INFO, "nowhere");
+    EXPECT_EQ(errno, EINTR);
+    EXPECT_FALSE(std::filesystem::exists(LogPath()));
+}
+
+TEST_F(HostTest, ConcurrentProcessesNeverInterleaveLines) {
+    HostCtl::Lib::OpenLog("VELK", 0, LOG_USER);
+    constexpr int kChildren = 4;
+    constexpr int kLines = 1000;
+    const std::string padding(300, 'p');
+    std::vector<pid_t> children;
+    for (int c = 0; c < kChildren; ++c) {
+        pid_t pid = fork();
+        ASSERT_GE(pid, 0);
+        if (pid == 0) {
+            for (int i = 0; i < kLines; ++i) Syslog(LOG_INFO, "child %d line %d %s", c, i, padding.c_str());
+            _exit(0);
+        }
+        children.push_back(pid);
+    }
+    for (pid_t pid : children) {
+        int status = 0;
+        ASSERT_EQ(waitpid(pid, &status, 0), pid);
+        ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
+    }
+    const std::regex line(R"(\S+ VELK\[\d+\]: user\.info: child (\d) line (\d+) p{300})");
+    std::istringstream log(Log());
+    std::string text;
+    std::vector<int> next(kChildren, 0);
+    int count = 0;
+    while (std::getline(log, text)) {
+        std::smatch m;
+        ASSERT_TRUE(std::regex_match(text, m, line)) << text.substr(0, 120);
+        int child = std::stoi(m[1]);
+        EXPECT_EQ(std::stoi(m[2]), next[size_t(child)]++);  // each child's lines in its order
+        ++count;
+    }
+    EXPECT_EQ(count, kChildren * kLines);
+}
+
+// The choice made from VELK_HOST_ROOT at start-up, seen in a fresh process:
+// the probe prints what it found, with the given VELK_HOST_ROOT (null: unset).
+std::string Probe(const char* hostRoot) {
+    int out[2];
+    if (pipe(out) != 0) return "pipe failed";
+    pid_t pid = fork();
+    if (pid == 0) {
+        dup2(out[1], 1);
+        dup2(out[1], 2);
+        close(out[0]);
+        close(out[1]);
+        if (hostRoot)
+            setenv("VELK_HOST_ROOT", hostRoot, 1);
+        else
+            unsetenv("VELK_HOST_ROOT");
+        execl(HOSTCTL_PROBE_BIN, "hostctl_probe", static_cast<char*>(nullptr));
+        _exit(127);
+    }
+    close(out[1]);
+    std::string text;
+    char buf[4096];
+    ssize_t n;
+    while ((n = read(out[0], buf, sizeof buf)) > 0) text.append(buf, size_t(n));
+    close(out[0]);
+    int status = 0;
+    waitpid(pid, &status, 0);
+    if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) text += "exit status " + std::to_string(status);
+    return text;
+}
+
+TEST(HostChoice, EnvironmentNamesTheSimulatedHost) {
+    TempDir dir;
+    std::filesystem::create_directories(dir.Path() + "/var/log");
+    HostCtl::Lib::SimState(dir.Path()).Replace(HostCtl::Lib::DefaultHostState("esx7.lab.test"));
+    EXPECT_EQ(Probe((dir.Path() + "/").c_str()),
+              "simulated=1\nroot=" + dir.Path() + "\npath=" + dir.Path() + "/bin/ls\nhostname=esx7\n");
+    // Before any OpenLog the identity is the program's short name.
+    const std::string log = ReadFile(dir.Path() + "/var/log/syslog.log");
+    EXPECT_TRUE(std::regex_match(log, std::regex(R"(\S+ hostctl_probe\[\d+\]: user\.notice: probing\n)")))
+        << log;
+}
+
+TEST(HostChoice, MissingRootStaysSimulatedAndFailsClearly) {
+    EXPECT_EQ(Probe("/nonexistent/host-root"),
+              "simulated=1\nroot=/nonexistent/host-root\npath=/nonexistent/host-root/bin/ls\n"
+              "hostname=error: /nonexistent/host-root/host.json: cannot open: No such file or directory\n");
+}
+
+TEST(HostChoice, WithoutRootTheRealHostIsUnavailable) {
+    const std::string out = Probe(nullptr);
+    EXPECT_EQ(out.rfind("simulated=0\nroot=\npath=/bin/ls\nhostname=error: ", 0), 0u) << out;
+    EXPECT_NE(out.find("not available on this host"), std::string::npos) << out;
+    EXPECT_EQ(Probe(""), out);  // an empty root is no root
+}
+
+}  // namespace

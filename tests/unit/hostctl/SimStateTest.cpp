@@ -1,0 +1,247 @@
+// The simulated host's state file: changes seen across objects and
+// processes, no lost updates, and clear errors for a broken file.
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include "TestSupport.hpp"
+#include "hostctl/Backend.hpp"
+#include "hostctl/QelCtl.hpp"
+
+namespace {
+
+using namespace HostCtlTest;
+using HostCtl::Lib::HostCtlException;
+using HostCtl::Lib::SimState;
+using nlohmann::json;
+
+class SimStateTest : public ::testing::Test {
+protected:
+    void SetUp() override { SimState(Root()).Replace(json{{"alert", "a"}, {"counter", 0}}); }
+    const std::string& Root() const { return _dir.Path(); }
+    std::string StatePath() const { return Root() + "/host.json"; }
+
+private:
+    TempDir _dir;
+};
+
+void SetAlert(const std::string& root, const std::string& alert) {
+    SimState(root).Update([&](json& s) { s["alert"] = alert; });
+}
+
+TEST_F(SimStateTest, WriteByAnotherObjectIsSeenAtOnce) {
+    SimState reader(Root());
+    // Same-size values written in quick succession, two between reads: the
+    // second file may get the inode of the one the reader saw, so only the
+    // strictly later modification time tells the states apart.
+    for (int i = 0; i < 50; ++i) {
+        SetAlert(Root(), "x");
+        const std::string alert(1, char('a' + i % 26));
+        SetAlert(Root(), alert);
+        ASSERT_EQ(reader.Read()->at("alert"), alert) << "round " << i;
+    }
+}
+
+TEST_F(SimStateTest, WriteByAnotherProcessIsSeen) {
+    SimState reader(Root());
+    for (int i = 0; i < 20; ++i) {
+        const std::string alert = i % 2 ? "x" : "y";
+        ASSERT_NE(reader.Read()->at("alert"), alert);  // cached before the child writes
+        pid_t pid = fork();
+        ASSERT_GE(pid, 0);
+        if (pid == 0) {
+            try {
+                SetAlert(Root(), alert);
+            } catch (...) {
+                _exit(1);
+            }
+            _exit(0);
+        }
+        int status = 0;
+        ASSERT_EQ(waitpid(pid, &status, 0), pid);
+        ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
+        ASSERT_EQ(reader.Read()->at("alert"), alert) << "round " << i;
+    }
+}
+
+TEST_F(SimStateTest, ConcurrentProcessesLoseNoUpdate) {
+    constexpr int kChildren = 4;
+    constexpr int kIncrements = 50;
+    std::vector<pid_t> children;
+    for (int c = 0; c < kChildren; ++c) {
+        pid_t pid = fork();
+        ASSERT_GE(pid, 0);
+        if (pid == 0) {
+            try {
+                SimState state(Root());
+                for (int i = 0; i < kIncrements; ++i)
+                    state.Update([](json& s) { s["counter"] = s["counter"].get<int>() + 1; });
+            } catch (...) {
+                _exit(1);
+            }
+            _exit(0);
+        }
+        children.push_back(pid);
+    }
+    // Meanwhile every read finds a whole file and a counter that never goes
+    // back. Failures are only noted here: the children are always waited for.
+    SimState reader(Root());
+    int last = 0;
+    int reads = 0;
+    bool monotonic = true;
+    std::string readError;
+    for (size_t done = 0; done < children.size();) {
+        try {
+            int now = reader.Read()->at("counter").get<int>();
+            monotonic = monotonic && now >= last;
+            last = now;
+            ++reads;
+        } catch (const std::exception& e) {
+            readError = e.what();
+        }
+        int status = 0;
+        pid_t pid = waitpid(-1, &status, WNOHANG);
+        if (pid > 0) {
+            EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
+            ++done;
+        }
+    }
+    EXPECT_TRUE(monotonic);
+    EXPECT_EQ(readError, "");
+    EXPECT_GT(reads, 0);
+    EXPECT_EQ(reader.Read()->at("counter").get<int>(), kChildren * kIncrements);
+    EXPECT_EQ(SimState(Root()).Read()->at("counter").get<int>(), kChildren * kIncrements);
+}
+
+TEST_F(SimStateTest, FailedChangeWritesNothing) {
+    const std::string before = ReadFile(StatePath());
+    SimState state(Root());
+    EXPECT_THROW(state.Update([](json& s) {
+        s["alert"] = "changed";
+        throw HostCtlException("refused");
+    }),
+                 HostCtlException);
+    EXPECT_EQ(ReadFile(StatePath()), before);
+    EXPECT_EQ(state.Read()->at("alert"), "a");
+}
+
+// A one-line text that starts with the state file's path and contains `what`.
+void ExpectStateError(const std::function<void()>& call, const std::string& path, const std::string& what) {
+    try {
+        call();
+        ADD_FAILURE() << "no exception; expected " << what;
+    } catch (const HostCtlException& e) {
+        const std::string text = e.what();
+        EXPECT_EQ(text.rfind(path + ": ", 0), 0u) << text;
+        EXPECT_NE(text.find(what), std::string::npos) << text;
+        EXPECT_EQ(text.find('\n'), std::string::npos) << text;
+    }
+}
+
+TEST_F(SimStateTest, BrokenFilesGiveErrorsNamingTheFile) {
+    struct Case {
+        const char* content;  // null: no file
+        const char* what;
+    };
+    const Case cases[] = {
+        {nullptr, "cannot open: No such file or directory"},
+        {"", "parse error"},
+        {"{\"alert\": }", "parse error at line 1"},
+        {"{\"alert\": \"a\"", "parse error"},
+        {"[1, 2]", "not a JSON object"},
+        {"\"text\"", "not a JSON object"},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.content ? c.content : "(missing)");
+        unlink(StatePath().c_str());
+        if (c.content) WriteFile(StatePath(), c.content);
+        SimState state(Root());
+        ExpectStateError([&] { state.Read(); }, StatePath(), c.what);
+        ExpectStateError([&] { state.Update([](json&) {}); }, StatePath(), c.what);
+        if (c.content) {
+            EXPECT_EQ(ReadFile(StatePath()), c.content);  // left as it was
+        }
+    }
+}
+
+TEST_F(SimStateTest, CachedStateIsDroppedWhenTheFileBreaks) {
+    SimState state(Root());
+    state.Read();
+    WriteFile(StatePath(), "{broken");
+    ExpectStateError([&] { state.Read(); }, StatePath(), "parse error");
+}
+
+// Fields of the wrong type, seen through the operations that read them.
+class WrongFieldTest : public SimHostTest {};
+
+TEST_F(WrongFieldTest, OperationsNameTheFileAndTheField) {
+    struct Case {
+        const char* pointer;
+        json value;
+        std::function<void()> call;
+        const char* what;
+    };
+    const Case cases[] = {
+        {"/system/systemAlert", 5, [] { QelCtl::System::SystemInfoImpl().GetSystemAlert(); },
+         "field /system/systemAlert must be a string"},
+        {"/vms/running", "no", [] { QelCtl::Resource::ResourceInfoImpl().HasRunningVirtualMachines(); },
+         "field /vms/running must be a non-negative integer"},
+        {"/hardware/memory/totalPages", -1, [] { QelCtl::Hardware::MemoryInfoImpl().GetTotalPages(); },
+         "field /hardware/memory/totalPages must be a non-negative integer"},
+        {"/network/dns/servers/0", "300.1.1.1",
+         [] { QelCtl::Network::DnsConfigImpl("defaultTcpipStack").GetNameServers(); },
+         "field /network/dns/servers/0 is not an IPv4 address: \"300.1.1.1\""},
+        {"/network/routing/ipv6Gateway", "fe80::zz",
+         [] { QelCtl::Network::RoutingInfoImpl("defaultTcpipStack").GetIpv6QelKernelDefaultGateway(); },
+         "field /network/routing/ipv6Gateway is not an IPv6 address"},
+        {"/network/dns/searchDomains", "example.test",
+         [] { QelCtl::Network::DnsConfigImpl("defaultTcpipStack").GetSearchDomains(); },
+         "field /network/dns/searchDomains must be an array"},
+        {"/network/vnics/0/ipv4/dhcp", "yes",
+         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetIpConfig(); },
+         "field /network/vnics/0/ipv4/dhcp must be true or false"},
+        {"/network/vnics/0/ipv6/addresses/0/type", "slaac",
+         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetIpConfig(); },
+         "field /network/vnics/0/ipv6/addresses/0/type must be"},
+        {"/network/vnics/0/ipv6/addresses/0/prefix", 129,
+         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetIpConfig(); },
+         "field /network/vnics/0/ipv6/addresses/0/prefix must be 0 to 128"},
+        {"/network/vnics/0/ipv4", json::array(),
+         [] {
+             QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->SetIpConfig(
+                 HostCtl::Network::IpConfig());
+         },
+         "field /network/vnics/0/ipv4 must be an object"},
+        {"/network/pnics/0/speedMbps", 1.5, [] { QelCtl::Network::NetworkInfoImpl().GetPnics(); },
+         "field /network/pnics/0/speedMbps must be an integer"},
+        {"/version/buildNumber", 4294967296, [] { HostCtl::Lib::GetBackend().GetVersionRecord(); },
+         "field /version/buildNumber is too large"},
+        {"/advancedOptions/~1UserVars~1VelkTimeOut", true,
+         [] { QelCtl::Adv::AdvancedOptionImpl().FindOption("/UserVars/VelkTimeOut"); },
+         "field /advancedOptions/~1UserVars~1VelkTimeOut must be an integer or a string"},
+        {"/smartCards/slots/0/token", "card",
+         [] {
+             QelCtl::Hardware::SmartCardToken token;
+             QelCtl::Hardware::SmartCardInfoImpl().GetToken({"slot0"}, token);
+         },
+         "field /smartCards/slots/0/token must be an object"},
+        {"/network/managementInterface", "qk9",
+         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetConnectionPoint(); },
+         "no virtual NIC named \"qk9\""},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.pointer);
+        SimState(Root()).Replace(HostCtl::Lib::DefaultHostState());
+        Edit([&](json& s) { s[json::json_pointer(c.pointer)] = c.value; });
+        const std::string before = ReadFile(StatePath());
+        ExpectStateError(c.call, StatePath(), c.what);
+        EXPECT_EQ(ReadFile(StatePath()), before);
+    }
+}
+
+TEST_F(WrongFieldTest, MissingSectionIsNamed) {
+    Edit([](json& s) { s.erase("hardware"); });
+    ExpectStateError([] { QelCtl::Hardware::CpuInfoImpl().GetNumCpuPackages(); }, StatePath(),
+                     "missing field /hardware/cpu/packages");
+}
+
+}  // namespace

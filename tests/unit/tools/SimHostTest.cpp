@@ -1,0 +1,270 @@
+// velk-simhost: creating a host root, and reading and changing its state.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <regex>
+#include <sstream>
+
+#include "ToolTestSupport.hpp"
+
+namespace ToolTest {
+namespace {
+
+namespace fs = std::filesystem;
+using nlohmann::json;
+
+using SimHostCreate = HostTest;
+using SimHostState = HostTest;
+
+std::vector<std::string> Words(const std::string& text) {
+    std::istringstream in(text);
+    std::vector<std::string> words;
+    for (std::string w; in >> w;) words.push_back(w);
+    return words;
+}
+
+TEST_F(SimHostCreate, MakesEveryFile) {
+    enum Kind { Folder, EmptyFolder, Data, Empty, Script, Link };
+    struct Case {
+        const char* path;
+        Kind kind;
+        const char* target = "";
+    };
+    const Case cases[] = {
+        {"/host.json", Data},
+        {"/etc/zolva/ssl/rui.crt", Data},
+        {"/etc/ssh/ssh_host_rsa_key", Data},
+        {"/etc/ssh/ssh_host_rsa_key.pub", Data},
+        {"/etc/hosts", Data},
+        {"/var/log/syslog.log", Data},
+        {"/var/log/qelkernel.log", Data},
+        {"/var/log/sysboot.log", Data},
+        {"/var/log/corad.log", Data},
+        {"/var/log/tirpa.log", Data},
+        {"/var/log/halvo.log", Data},
+        {"/var/log/obzd.log", Data},
+        {"/var/run/zolva/show-velk-login", Empty},
+        {"/var/run", Folder},
+        {"/dev", EmptyFolder},
+        {"/bin/hrm-cmd", Script},
+        {"/sbin/grabCIMData", Script},
+        {"/bin/powerOffVms", Script},
+        {"/sbin/powerOffVms", Script},
+        {"/bin/openssl", Script},
+        {"/usr/lib/zolva/openssh/bin/ssh-keygen", Link, "/usr/bin/ssh-keygen"},
+        {"/bin/less", Link, "/usr/bin/less"},
+        {"/bin/sh", Link, "/bin/sh"},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.path);
+        fs::path path = _root + c.path;
+        std::error_code ec;
+        switch (c.kind) {
+            case Folder:
+                EXPECT_TRUE(fs::is_directory(path));
+                break;
+            case EmptyFolder:
+                EXPECT_TRUE(fs::is_directory(path) && fs::is_empty(path, ec));
+                break;
+            case Data:
+                EXPECT_TRUE(fs::is_regular_file(path) && fs::file_size(path, ec) > 0);
+                break;
+            case Empty:
+                EXPECT_TRUE(fs::is_regular_file(path) && fs::file_size(path, ec) == 0);
+                break;
+            case Script:
+                EXPECT_TRUE(fs::is_regular_file(path) && access(path.c_str(), X_OK) == 0);
+                EXPECT_EQ(ReadFile(path).rfind("#!/bin/sh\n", 0), 0u);
+                break;
+            case Link:
+                EXPECT_TRUE(fs::is_symlink(path));
+                EXPECT_EQ(fs::read_symlink(path, ec).string(), c.target);
+                break;
+        }
+    }
+    // The console switches terminals through "/dev/console"; on a simulated
+    // host that must find nothing.
+    EXPECT_FALSE(fs::exists(_root + "/dev/console"));
+
+    json state = State();
+    EXPECT_EQ(state["network"]["dns"]["hostname"], "host1");
+    EXPECT_EQ(state["network"]["dns"]["domain"], "example.test");
+    EXPECT_NE(ReadFile(_root + "/etc/hosts").find("host1.example.test"), std::string::npos);
+
+    // The certificate and the keys are read the way the console reads them.
+    Result cert = Tool("/bin/openssl", {"x509", "-in", _root + "/etc/zolva/ssl/rui.crt", "-noout",
+                                        "-fingerprint", "-sha1", "-subject"});
+    ASSERT_EQ(cert.status, 0) << cert.err;
+    EXPECT_TRUE(std::regex_search(cert.out, std::regex("^SHA1 Fingerprint=([0-9A-F]{2}:){19}[0-9A-F]{2}\n")))
+        << cert.out;
+    EXPECT_NE(cert.out.find("\nsubject=CN = host1.example.test\n"), std::string::npos) << cert.out;
+    Result noCert = Tool("/bin/openssl", {"x509", "-in", _root + "/etc/zolva/ssl/none.crt", "-noout"});
+    EXPECT_NE(noCert.status, 0);
+    EXPECT_TRUE(noCert.out.empty());
+
+    Result rsa =
+        Tool("/usr/lib/zolva/openssh/bin/ssh-keygen", {"-l", "-f", _root + "/etc/ssh/ssh_host_rsa_key"});
+    ASSERT_EQ(rsa.status, 0) << rsa.err;
+    std::vector<std::string> words = Words(rsa.out);
+    ASSERT_GE(words.size(), 3u) << rsa.out;
+    EXPECT_EQ(words[0], "2048");
+    EXPECT_EQ(words[1].rfind("SHA256:", 0), 0u);
+    EXPECT_EQ(words.back(), "(RSA)");
+
+    // A DSA key only where ssh-keygen can still make one, and then whole.
+    std::string dsaKey = _root + "/etc/ssh/ssh_host_dsa_key";
+    EXPECT_EQ(fs::exists(dsaKey), fs::exists(dsaKey + ".pub"));
+    if (fs::exists(dsaKey)) {
+        Result dsa = Tool("/usr/lib/zolva/openssh/bin/ssh-keygen", {"-l", "-f", dsaKey});
+        EXPECT_EQ(dsa.status, 0) << dsa.err;
+        EXPECT_NE(dsa.out.find("(DSA)"), std::string::npos);
+    }
+
+    // The host's syslog is in the format the console's own lines use.
+    std::istringstream syslog(ReadFile(_root + "/var/log/syslog.log"));
+    std::regex line(R"(^\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d\.\d{3}Z [\w-]+\[\d+\]: [a-z]+\.[a-z]+: .+$)");
+    for (std::string l; std::getline(syslog, l);) EXPECT_TRUE(std::regex_match(l, line)) << l;
+}
+
+TEST_F(SimHostCreate, PrintsOneLineNamingTheRoot) {
+    std::string root = _dir + "/second";
+    Result r = SimHost({"create", root});
+    ASSERT_EQ(r.status, 0) << r.err;
+    EXPECT_EQ(Lines(r.out), 1u);
+    EXPECT_NE(r.out.find(root), std::string::npos) << r.out;
+    EXPECT_EQ(SimHost({"get", root, "/network/dns/hostname"}).out, "\"host1\"\n");
+}
+
+TEST_F(SimHostCreate, RefusesAnExistingRootUnlessForced) {
+    Edit("/marker", 1);
+    Result refused = SimHost({"create", _root});
+    EXPECT_EQ(refused.status, 1);
+    EXPECT_EQ(Lines(refused.err), 1u) << refused.err;
+    EXPECT_NE(refused.err.find("--force"), std::string::npos) << refused.err;
+    EXPECT_EQ(State()["marker"], 1);
+
+    Result forced = SimHost({"create", _root, "--force", "--hostname", "esx9"});
+    ASSERT_EQ(forced.status, 0) << forced.err;
+    json state = State();
+    EXPECT_FALSE(state.contains("marker"));
+    EXPECT_EQ(state["network"]["dns"]["hostname"], "esx9");
+    Result after = Hrm("root", "hrmsvc/auth/lockdown_is_possible");
+    EXPECT_EQ(after.status, 0) << after.err;
+    EXPECT_EQ(after.out, "true\n");
+
+    // An existing empty folder is taken as it is; a file is not a folder.
+    fs::create_directory(_dir + "/empty");
+    EXPECT_EQ(SimHost({"create", _dir + "/empty"}).status, 0);
+    WriteFile(_dir + "/file", "x");
+    Result onFile = SimHost({"create", _dir + "/file", "--force"});
+    EXPECT_EQ(onFile.status, 1);
+    EXPECT_EQ(Lines(onFile.err), 1u) << onFile.err;
+}
+
+TEST_F(SimHostCreate, BadArgumentsFailCleanly) {
+    std::string fresh = _dir + "/fresh";
+    const std::vector<std::vector<std::string>> cases = {
+        {},
+        {"create"},
+        {"create", fresh, "--hostname"},
+        {"create", fresh, "--hostname", "bad name"},
+        {"create", fresh, "--hostname", "semi;colon"},
+        {"create", fresh, "--bogus"},
+        {"create", fresh, "extra", "argument"},
+        {"frobnicate", _root},
+        {"get", _root},
+        {"set", _root, "/x"},
+        {"remove", _root, "/x", "y"},
+    };
+    for (const auto& args : cases) {
+        std::string shown;
+        for (const auto& a : args) shown += a + " ";
+        SCOPED_TRACE(shown);
+        Result r = SimHost(args);
+        EXPECT_EQ(r.status, 1);
+        EXPECT_FALSE(r.err.empty());
+        EXPECT_TRUE(r.out.empty());
+    }
+    EXPECT_FALSE(fs::exists(fresh));
+}
+
+TEST_F(SimHostState, SetGetRemoveRoundTrip) {
+    struct Case {
+        const char* pointer;
+        const char* value;
+        const char* readAt;  // where the value is read back
+        const char* printed;
+    };
+    const Case cases[] = {
+        {"/network/vnics/0/ipv4/address", "\"10.0.0.7\"", "", "\"10.0.0.7\""},
+        {"/network/vnics/0/ipv4/address", "10.0.0.8", "", "\"10.0.0.8\""},  // not JSON: a string
+        {"/system/welcomeMessage", "Hands off", "", "\"Hands off\""},
+        {"/vms/running", "3", "", "3"},
+        {"/hostAgent/lockdownPossible", "false", "", "false"},
+        {"/new/deep/member", "{\"a\": [1]}", "/new/deep/member/a/0", "1"},
+        {"/advancedOptions/~1UserVars~1VelkTimeOut", "30", "", "30"},
+        {"/network/dns/servers/-", "\"10.0.0.1\"", "/network/dns/servers/1", "\"10.0.0.1\""},
+        {"/network/dns/servers/2", "\"10.0.0.2\"", "/network/dns/servers/2", "\"10.0.0.2\""},
+        {"/network/pnics", "[]", "", "[]"},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.pointer);
+        Result set = SimHost({"set", _root, c.pointer, c.value});
+        ASSERT_EQ(set.status, 0) << set.err;
+        EXPECT_TRUE(set.err.empty());
+        std::string readAt = *c.readAt ? c.readAt : c.pointer;
+        Result get = SimHost({"get", _root, readAt});
+        EXPECT_EQ(get.status, 0) << get.err;
+        EXPECT_EQ(get.out, std::string(c.printed) + "\n");
+        EXPECT_EQ(State()[json::json_pointer(readAt)], json::parse(c.printed));
+    }
+
+    Result removed = SimHost({"remove", _root, "/new/deep/member"});
+    EXPECT_EQ(removed.status, 0) << removed.err;
+    EXPECT_EQ(SimHost({"get", _root, "/new/deep/member"}).status, 1);
+    EXPECT_EQ(SimHost({"get", _root, "/new/deep"}).out, "{}\n");
+    EXPECT_EQ(SimHost({"remove", _root, "/network/dns/servers/0"}).status, 0);
+    EXPECT_EQ(State()["network"]["dns"]["servers"], json({"10.0.0.1", "10.0.0.2"}));
+}
+
+TEST_F(SimHostState, BadInputIsOneLineAndLeavesTheStateAlone) {
+    const std::string good = ReadFile(_root + "/host.json");
+    struct Case {
+        const char* state;  // host.json text, or null to keep the created one
+        std::vector<std::string> args;
+        const char* mentions;
+    };
+    const std::string missing = _dir + "/nohost";
+    const Case cases[] = {
+        {nullptr, {"get", missing, "/vms"}, "nohost/host.json"},
+        {nullptr, {"set", missing, "/vms", "1"}, "nohost/host.json"},
+        {"{\"network\": ", {"get", _root, "/network"}, "host.json: parse error"},
+        {"{\"network\": ", {"set", _root, "/network", "1"}, "host.json: parse error"},
+        {"[1, 2]", {"remove", _root, "/0"}, "not a JSON object"},
+        {"", {"get", _root, "/vms"}, "host.json"},
+        {nullptr, {"get", _root, "network"}, "bad pointer \"network\""},
+        {nullptr, {"get", _root, "/a~2b"}, "bad pointer \"/a~2b\""},
+        {nullptr, {"get", _root, "/nope/deeper"}, "/nope: no such field"},
+        {nullptr, {"set", _root, "/vms/running/x", "1"}, "/vms/running is a number"},
+        {nullptr, {"set", _root, "/network/vnics/3/name", "\"x\""}, "/network/vnics/3: no such element"},
+        {nullptr, {"set", _root, "/network/vnics/first/name", "\"x\""}, "\"first\" is not an array index"},
+        {nullptr, {"set", _root, "", "[]"}, "JSON object"},
+        {nullptr, {"remove", _root, "/nope"}, "/nope: no such field"},
+        {nullptr, {"remove", _root, ""}, "whole document"},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.args[0] + " " + c.args[2]);
+        std::string before = c.state ? c.state : good;
+        WriteFile(_root + "/host.json", before);
+        Result r = SimHost(c.args);
+        EXPECT_EQ(r.status, 1);
+        EXPECT_EQ(Lines(r.err), 1u) << r.err;
+        EXPECT_NE(r.err.find(c.mentions), std::string::npos) << r.err;
+        EXPECT_EQ(ReadFile(_root + "/host.json"), before);
+    }
+    EXPECT_FALSE(fs::exists(missing));
+}
+
+}  // namespace
+}  // namespace ToolTest

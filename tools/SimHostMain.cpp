@@ -1,0 +1,130 @@
+// velk-simhost: creates a simulated host and reads or changes its state.
+//   velk-simhost create ROOT [--hostname NAME] [--force]
+//   velk-simhost get ROOT POINTER
+//   velk-simhost set ROOT POINTER VALUE
+//   velk-simhost remove ROOT POINTER
+// POINTER is a JSON pointer into ROOT/host.json; VALUE is JSON, or else taken
+// as a string.
+#include <unistd.h>
+
+#include <cstdio>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "HostRootCreator.hpp"
+#include "StateEdit.hpp"
+#include "hostctl/SimState.hpp"
+
+namespace {
+
+namespace fs = std::filesystem;
+using nlohmann::json;
+
+const char* const USAGE =
+    "usage: velk-simhost create ROOT [--hostname NAME] [--force]\n"
+    "       velk-simhost get ROOT POINTER\n"
+    "       velk-simhost set ROOT POINTER VALUE\n"
+    "       velk-simhost remove ROOT POINTER\n";
+
+int Usage(const std::string& problem) {
+    if (!problem.empty()) std::fprintf(stderr, "velk-simhost: %s\n", problem.c_str());
+    std::fputs(USAGE, stderr);
+    return 1;
+}
+
+std::string OneLine(std::string text) {
+    for (char& c : text)
+        if (c == '\n' || c == '\r') c = ' ';
+    return text;
+}
+
+int Error(const std::string& text) {
+    std::fprintf(stderr, "velk-simhost: %s\n", OneLine(text).c_str());
+    return 1;
+}
+
+// velk-hostcmd sits next to this program in the build tree and where both are
+// installed; the path it was built at is the fallback.
+std::string HostCommandBinary() {
+    std::error_code ec;
+    fs::path self = fs::read_symlink("/proc/self/exe", ec);
+    if (!ec) {
+        fs::path sibling = self.parent_path() / "velk-hostcmd";
+        if (access(sibling.c_str(), X_OK) == 0) return sibling.string();
+    }
+    return VELK_HOSTCMD_BIN;
+}
+
+int Create(const std::vector<std::string>& args) {
+    VelkTools::HostRootOptions options;
+    options.hostCommandBinary = HostCommandBinary();
+    bool haveRoot = false;
+    for (size_t i = 0; i < args.size(); ++i) {
+        if (args[i] == "--force") {
+            options.force = true;
+        } else if (args[i] == "--hostname") {
+            if (i + 1 >= args.size()) return Usage("--hostname needs a name");
+            options.hostname = args[++i];
+        } else if (!args[i].empty() && args[i][0] == '-') {
+            return Usage("unknown option " + args[i]);
+        } else if (!haveRoot) {
+            options.root = args[i];
+            haveRoot = true;
+        } else {
+            return Usage("unexpected argument " + args[i]);
+        }
+    }
+    if (!haveRoot || options.root.empty()) return Usage("no host root given");
+    std::string root = VelkTools::CreateHostRoot(options);
+    std::printf("Created the simulated host %s in %s\n", options.hostname.c_str(), root.c_str());
+    return 0;
+}
+
+// Runs one state command; errors about the pointer name the state file.
+int Edit(const std::string& command, const std::vector<std::string>& args) {
+    size_t expected = command == "set" ? 3 : 2;
+    if (args.size() != expected)
+        return Usage(command + " takes " + (expected == 3 ? "ROOT POINTER VALUE" : "ROOT POINTER"));
+    HostCtl::Lib::SimState sim(args[0]);
+    const std::string& pointer = args[1];
+    try {
+        // Read first: a missing or malformed state is reported as such, and
+        // nothing (not even a lock file) is made in a folder that is no host.
+        std::shared_ptr<const json> state = sim.Read();
+        if (command == "get") {
+            const json& value = VelkTools::GetAt(*state, pointer);
+            bool structured = value.is_structured() && !value.empty();
+            std::printf("%s\n",
+                        value.dump(structured ? 2 : -1, ' ', false, json::error_handler_t::replace).c_str());
+        } else if (command == "set") {
+            json value = VelkTools::ParseValue(args[2]);
+            sim.Update([&](json& latest) { VelkTools::SetAt(latest, pointer, value); });
+        } else {
+            sim.Update([&](json& latest) { VelkTools::RemoveAt(latest, pointer); });
+        }
+    } catch (const VelkTools::PointerError& e) {
+        return Error(sim.Error(e.what()).what());
+    }
+    return 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    std::vector<std::string> args(argv + 1, argv + argc);
+    if (args.empty()) return Usage("");
+    std::string command = args[0];
+    args.erase(args.begin());
+    if (command == "help" || command == "--help" || command == "-h") {
+        std::fputs(USAGE, stdout);
+        return 0;
+    }
+    try {
+        if (command == "create") return Create(args);
+        if (command == "get" || command == "set" || command == "remove") return Edit(command, args);
+    } catch (const std::exception& e) {
+        return Error(e.what());
+    }
+    return Usage("unknown command " + command);
+}
