@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <syslog.h>
 
+#include <algorithm>
 #include <cstring>
 #include <memory>
 
@@ -98,7 +99,15 @@ void WelcomeWindow::MakeStandardLayout() {
     Box();
     const int w = _lower->GetWidth();
     const int h = _lower->GetHeight();
-    _warning = new TextArea(_lower, 16, 9, COLS - 32, 6, DARK_GREY);
+    // The warning sits below the network lines and above the footer. On a
+    // short screen (25 lines) its six rows would cover the footer and the
+    // border, so it takes the rows that are left, at the network lines' width.
+    const int warningRows = h - 2 - 9;
+    if (warningRows >= 6) {
+        _warning = new TextArea(_lower, 16, 9, COLS - 32, 6, DARK_GREY);
+    } else {
+        _warning = new TextArea(_lower, 8, 9, COLS - 16, std::max(1, warningRows), DARK_GREY);
+    }
     _footer = new TextArea(_lower, 2, h - 2, w - 4, 1, BLACK);
     _footer->SetText(std::string("<F2> {color:dark-grey}") + _factory->GetString(0) + "{/color}" +
                      "{align:right}<F12> {color:dark-grey}" + _factory->GetString(1) + "{/color}{/align}");

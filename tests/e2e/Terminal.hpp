@@ -85,7 +85,7 @@ private:
     std::string _held;
 };
 
-// Parses the body of an xterm palette OSC, "4;n;rgb:rr/gg/bb[;n;spec...]"
+// Parses the body of an xterm palette OSC, "4;n;rgb:rr/gg/bb[;n;rgb:...]"
 // (1 to 4 hex digits per component). Returns false when it is not one.
 bool ParsePaletteOsc(std::string_view body, std::vector<PaletteChange>& changes);
 

@@ -9,18 +9,14 @@
 namespace E2e {
 namespace {
 
-std::string Pass(LinuxPaletteFilter& filter, std::string_view bytes, std::vector<PaletteChange>& changes) {
-    return filter.Feed(bytes, changes);
-}
-
 TEST(LinuxPaletteFilterTest, CutsSequencesSplitAtEveryByte) {
     const std::string stream = "ab\x1b]P6545454cd\x1b[0m\x1b]Rz\x1b]P3FECC00";
     const std::vector<PaletteChange> expected = {{6, {0x54, 0x54, 0x54}}, {-1, {}}, {3, {0xfe, 0xcc, 0x00}}};
     for (size_t split = 0; split <= stream.size(); ++split) {
         LinuxPaletteFilter filter;
         std::vector<PaletteChange> changes;
-        std::string out = Pass(filter, std::string_view(stream).substr(0, split), changes);
-        out += Pass(filter, std::string_view(stream).substr(split), changes);
+        std::string out = filter.Feed(std::string_view(stream).substr(0, split), changes);
+        out += filter.Feed(std::string_view(stream).substr(split), changes);
         EXPECT_EQ(out, "abcd\x1b[0mz") << "split at " << split;
         EXPECT_EQ(changes, expected) << "split at " << split;
     }

@@ -41,9 +41,11 @@ std::string NetworkText(const Terminal& t) {
     return t.RegionText(8, l.NetworkRow(), l.cols - 16, 7);
 }
 
+// The warning area has six rows, of which a short screen shows only those
+// above the footer.
 std::string WarningText(const Terminal& t) {
     Layout l{t.Cols(), t.Rows()};
-    return t.RegionText(16, l.WarningRow(), l.cols - 32, 6);
+    return t.RegionText(16, l.WarningRow(), l.cols - 32, std::min(6, l.FooterRow() - l.WarningRow()));
 }
 
 struct ScreenCase {
