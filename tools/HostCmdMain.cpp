@@ -1,6 +1,7 @@
 // velk-hostcmd: the simulated host's command-line tools in one program.
 //   velk-hostcmd --root ROOT TOOL [ARGS...]
-// TOOL is hrm-cmd, grabCIMData, powerOffVms or openssl. A host root holds small
+// TOOL is hrm-cmd, grabCIMData, powerOffVms, reboot, poweroff,
+// firmwareConfig.sh or openssl. A host root holds small
 // scripts under the tools' host paths that run this program with the root
 // filled in, so the tools work with an empty environment, as the console
 // runs them.
@@ -17,15 +18,15 @@ namespace {
 using Tool = int (*)(HostCtl::Lib::SimState&, const std::vector<std::string>&, std::string&, std::string&);
 
 const std::map<std::string, Tool> TOOLS = {
-    {"hrm-cmd", VelkTools::HrmCmd},
-    {"grabCIMData", VelkTools::GrabCimData},
-    {"powerOffVms", VelkTools::PowerOffVms},
+    {"hrm-cmd", VelkTools::HrmCmd},          {"grabCIMData", VelkTools::GrabCimData},
+    {"powerOffVms", VelkTools::PowerOffVms}, {"reboot", VelkTools::Reboot},
+    {"poweroff", VelkTools::Poweroff},       {"firmwareConfig.sh", VelkTools::FirmwareConfig},
 };
 
 int Usage() {
     std::fputs(
         "usage: velk-hostcmd --root ROOT TOOL [ARGS...]\n"
-        "  TOOL: hrm-cmd, grabCIMData, powerOffVms or openssl\n"
+        "  TOOL: hrm-cmd, grabCIMData, powerOffVms, reboot, poweroff, firmwareConfig.sh or openssl\n"
         "  (VELK_HOST_ROOT stands for --root when it is left out)\n",
         stderr);
     return 1;

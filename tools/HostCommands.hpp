@@ -24,6 +24,18 @@ int GrabCimData(HostCtl::Lib::SimState& sim, const std::vector<std::string>& arg
 int PowerOffVms(HostCtl::Lib::SimState& sim, const std::vector<std::string>& args, std::string& out,
                 std::string& err);
 
+// reboot [-f] and poweroff [-f]: record the request and set /power/state to
+// "rebooting" or "off".
+int Reboot(HostCtl::Lib::SimState& sim, const std::vector<std::string>& args, std::string& out,
+           std::string& err);
+int Poweroff(HostCtl::Lib::SimState& sim, const std::vector<std::string>& args, std::string& out,
+             std::string& err);
+
+// firmwareConfig.sh --reset-only: records the request and sets
+// /power/resetDone.
+int FirmwareConfig(HostCtl::Lib::SimState& sim, const std::vector<std::string>& args, std::string& out,
+                   std::string& err);
+
 // openssl [ARGS...]: the machine's openssl, printing fingerprint lines the
 // way the host's openssl does. Writes straight to the standard streams and
 // needs no state.

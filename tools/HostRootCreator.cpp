@@ -8,7 +8,9 @@
 
 #include <cerrno>
 #include <filesystem>
+#include <fstream>
 #include <nlohmann/json.hpp>
+#include <random>
 #include <stdexcept>
 #include <system_error>
 #include <vector>
@@ -229,6 +231,49 @@ std::vector<std::pair<std::string, std::string>> Logs(const json& state, const s
     };
 }
 
+// The console authenticates through PAM service "velk". A simulated host
+// must not need /etc/pam.d, so its services live in ROOT/etc/pam-wrapper and
+// check passwords against ROOT/etc/pam-wrapper/passdb (user:password:service
+// lines) with pam_matrix. The console is run on such a host as
+//   PAM_WRAPPER=1 LD_PRELOAD=libpam_wrapper.so PAM_WRAPPER_SERVICE_DIR=ROOT/etc/pam-wrapper velk ...
+// Without PAM_WRAPPER=1 and the service folder, the preloaded wrapper makes
+// authentication spin forever, so always set all three together. A password
+// change rewrites passdb. "other" denies everything: without it libpam
+// prints complaints over the screen.
+void MakePam(const fs::path& root, const std::string& password) {
+    const fs::path dir = PamServiceDir(root.string());
+    MakeDirectories(dir);
+    // libpam splits a service line at blanks; an argument in square brackets
+    // may hold blanks, with "]" written as "\]".
+    std::string passdb = "passdb=" + PamPassdbPath(root.string());
+    if (passdb.find_first_of(" \t]") != std::string::npos) {
+        std::string quoted = "[";
+        for (char c : passdb) quoted += c == ']' ? std::string("\\]") : std::string(1, c);
+        passdb = quoted + "]";
+    }
+    const std::string matrix = std::string(VELK_PAM_WRAPPER_MODULES) + "/pam_matrix.so " + passdb;
+    std::string velk;
+    for (const char* type : {"auth", "account", "password"})
+        velk += std::string(type) + "\trequired\t" + matrix + "\n";
+    WriteFile(dir / "velk", velk, 0644);
+    WriteFile(
+        dir / "other",
+        "auth\trequired\tpam_deny.so\naccount\trequired\tpam_deny.so\npassword\trequired\tpam_deny.so\n",
+        0644);
+    // guest authenticates but may not use the console.
+    WriteFile(PamPassdbPath(root.string()), "root:" + password + ":velk\nguest:guest-pass:other\n", 0600);
+}
+
+// "demo-" and six random lowercase letters and digits.
+std::string DemoPassword() {
+    static const char ALPHABET[] = "abcdefghijklmnopqrstuvwxyz0123456789";
+    std::random_device random;
+    std::uniform_int_distribution<size_t> pick(0, sizeof ALPHABET - 2);
+    std::string password = "demo-";
+    for (int i = 0; i < 6; ++i) password += ALPHABET[pick(random)];
+    return password;
+}
+
 std::string ToolScript(const std::string& binary, const fs::path& root, const std::string& tool) {
     return "#!/bin/sh\n"
            "# A tool of a simulated host: runs the simulated " +
@@ -237,6 +282,27 @@ std::string ToolScript(const std::string& binary, const fs::path& root, const st
 }
 
 }  // namespace
+
+std::string PamServiceDir(const std::string& root) { return root + "/etc/pam-wrapper"; }
+
+std::string PamPassdbPath(const std::string& root) { return PamServiceDir(root) + "/passdb"; }
+
+std::string ReadRootPassword(const std::string& root) {
+    const std::string path = PamPassdbPath(root);
+    std::ifstream in(path);
+    if (!in) Fail(path + ": cannot read: " + ErrnoText(errno));
+    std::string line;
+    while (std::getline(in, line)) {
+        if (line.rfind("root:", 0) != 0) continue;
+        size_t end = line.find(':', 5);
+        return line.substr(5, end == std::string::npos ? std::string::npos : end - 5);
+    }
+    Fail(path + ": has no line for root");
+}
+
+bool IsValidPassword(const std::string& password) {
+    return !password.empty() && password.find_first_of(":\r\n") == std::string::npos;
+}
 
 bool IsValidHostname(const std::string& hostname) {
     if (hostname.empty() || hostname.size() > 253 || hostname.front() == '.' || hostname.back() == '.')
@@ -256,6 +322,9 @@ std::string CreateHostRoot(const HostRootOptions& options) {
         Fail("cannot find the simulated host tools: " +
              (options.hostCommandBinary.empty() ? std::string("no path") : options.hostCommandBinary) +
              " is not an executable");
+
+    if (!options.password.empty() && !IsValidPassword(options.password))
+        Fail("bad password: it may not hold ':' or line breaks");
 
     fs::path root = PrepareRoot(options);
     for (const char* dir : {"bin", "sbin", "dev", "etc/ssh", "etc/zolva/ssl", "var/log", "var/run/zolva",
@@ -281,11 +350,20 @@ std::string CreateHostRoot(const HostRootOptions& options) {
 
     for (const auto& [name, text] : Logs(state, fqdn)) WriteFile(root / "var/log" / name, text, 0644);
     WriteFile(root / "var/run/zolva/show-velk-login", "", 0644);
+    // The support information pages a host installs with the console.
+    fs::create_directories(root / "usr/share/velk");
+    fs::copy_file(VELK_SUPPORT_INFO, root / "usr/share/velk/support-info", fs::copy_options::overwrite_existing);
 
     WriteFile(root / "bin/hrm-cmd", ToolScript(options.hostCommandBinary, root, "hrm-cmd"), 0755);
     WriteFile(root / "sbin/grabCIMData", ToolScript(options.hostCommandBinary, root, "grabCIMData"), 0755);
     WriteFile(root / "bin/powerOffVms", ToolScript(options.hostCommandBinary, root, "powerOffVms"), 0755);
     WriteFile(root / "sbin/powerOffVms", ToolScript(options.hostCommandBinary, root, "powerOffVms"), 0755);
+
+    WriteFile(root / "sbin/reboot", ToolScript(options.hostCommandBinary, root, "reboot"), 0755);
+    WriteFile(root / "sbin/poweroff", ToolScript(options.hostCommandBinary, root, "poweroff"), 0755);
+    WriteFile(root / "sbin/firmwareConfig.sh",
+              ToolScript(options.hostCommandBinary, root, "firmwareConfig.sh"), 0755);
+    MakePam(root, options.password.empty() ? DemoPassword() : options.password);
 
     WriteFile(root / "bin/openssl", ToolScript(options.hostCommandBinary, root, "openssl"), 0755);
     MakeSymlink(SSH_KEYGEN, root / "usr/lib/zolva/openssh/bin/ssh-keygen");

@@ -12,11 +12,25 @@ struct HostRootOptions {
     std::string hostname = "host1";
     bool force = false;             // create over an existing, non-empty folder
     std::string hostCommandBinary;  // absolute path of velk-hostcmd
+    std::string password;           // root's console password; empty: a generated "demo-xxxxxx"
 };
 
 // Creates the host and returns its root as an absolute path. Throws
 // std::runtime_error with a one-line text on any failure.
 std::string CreateHostRoot(const HostRootOptions& options);
+
+// The PAM service folder of a host root (ROOT/etc/pam-wrapper) and its
+// password file.
+std::string PamServiceDir(const std::string& root);
+std::string PamPassdbPath(const std::string& root);
+
+// root's password as the host's password file holds it now. Throws
+// std::runtime_error when the file cannot be read or has no root line.
+std::string ReadRootPassword(const std::string& root);
+
+// True for a password that the host's password file can hold: not empty, no
+// ':' and no line breaks.
+bool IsValidPassword(const std::string& password);
 
 // True for a host name made of letters, digits, '-' and '.' only, not
 // starting or ending with '.'.

@@ -1,5 +1,6 @@
 // velk-simhost: creates a simulated host and reads or changes its state.
-//   velk-simhost create ROOT [--hostname NAME] [--force]
+//   velk-simhost create ROOT [--hostname NAME] [--password P] [--force]
+//   velk-simhost login ROOT
 //   velk-simhost get ROOT POINTER
 //   velk-simhost set ROOT POINTER VALUE
 //   velk-simhost remove ROOT POINTER
@@ -22,7 +23,8 @@ namespace fs = std::filesystem;
 using nlohmann::json;
 
 const char* const USAGE =
-    "usage: velk-simhost create ROOT [--hostname NAME] [--force]\n"
+    "usage: velk-simhost create ROOT [--hostname NAME] [--password P] [--force]\n"
+    "       velk-simhost login ROOT\n"
     "       velk-simhost get ROOT POINTER\n"
     "       velk-simhost set ROOT POINTER VALUE\n"
     "       velk-simhost remove ROOT POINTER\n";
@@ -66,6 +68,11 @@ int Create(const std::vector<std::string>& args) {
         } else if (args[i] == "--hostname") {
             if (i + 1 >= args.size()) return Usage("--hostname needs a name");
             options.hostname = args[++i];
+        } else if (args[i] == "--password") {
+            if (i + 1 >= args.size()) return Usage("--password needs a password");
+            options.password = args[++i];
+            if (!VelkTools::IsValidPassword(options.password))
+                return Usage("bad password: it may not be empty or hold ':' or line breaks");
         } else if (!args[i].empty() && args[i][0] == '-') {
             return Usage("unknown option " + args[i]);
         } else if (!haveRoot) {
@@ -78,6 +85,14 @@ int Create(const std::vector<std::string>& args) {
     if (!haveRoot || options.root.empty()) return Usage("no host root given");
     std::string root = VelkTools::CreateHostRoot(options);
     std::printf("Created the simulated host %s in %s\n", options.hostname.c_str(), root.c_str());
+    return 0;
+}
+
+// Prints the console login of the host, as its password file holds it now.
+int Login(const std::vector<std::string>& args) {
+    if (args.size() != 1) return Usage("login takes ROOT");
+    std::string password = VelkTools::ReadRootPassword(args[0]);
+    std::printf("Demo login: user root, password %s\n", password.c_str());
     return 0;
 }
 
@@ -122,6 +137,7 @@ int main(int argc, char** argv) {
     }
     try {
         if (command == "create") return Create(args);
+        if (command == "login") return Login(args);
         if (command == "get" || command == "set" || command == "remove") return Edit(command, args);
     } catch (const std::exception& e) {
         return Error(e.what());

@@ -4,6 +4,7 @@
 
 #include <cctype>
 
+#include "Pam.hpp"
 #include "TextArea.hpp"
 
 namespace Velk {
@@ -36,6 +37,13 @@ void InputItem::SetText(const std::string& text) {
     _fresh = true;
     _offset = 0;
     _position = Length();
+}
+
+void InputItem::WipeText() {
+    WipeSecret(_text);
+    _position = 0;
+    _offset = 0;
+    _fresh = true;
 }
 
 void InputItem::Clear() {

@@ -32,6 +32,9 @@ public:
     // Replaces the text; the field is fresh again with the cursor at the end.
     void SetText(const std::string& text);
     const std::string& GetText() const { return _text; }
+    // Overwrites the text's bytes and empties the field (password fields,
+    // once their value was used).
+    void WipeText();
     const std::string& GetLabel() const { return _label; }
     // Masked fields (passwords) show one "*" per character.
     void SetMasked(bool masked) { _masked = masked; }

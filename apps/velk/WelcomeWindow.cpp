@@ -8,8 +8,11 @@
 #include <memory>
 
 #include "Console.hpp"
+#include "GeneralWindow.hpp"
+#include "LoginDialog.hpp"
 #include "LoginDisabledDialog.hpp"
 #include "ManagementInterface.hpp"
+#include "ShutdownDialog.hpp"
 #include "StringFactory.hpp"
 #include "SystemInfo.hpp"
 #include "hostctl/Host.hpp"
@@ -226,11 +229,31 @@ void WelcomeWindow::Fill() {
 
 void WelcomeWindow::Update() { Draw(); }
 
-void WelcomeWindow::OnLoginKey(int /*key*/) {
+void WelcomeWindow::OnLoginKey(int key) {
     if (!FileExists(kLoginMarker)) {
         LoginDisabledDialog dialog(this);
         dialog.Execute();
+        return;
     }
+    {
+        LoginDialog login(this);
+        if (login.Execute() != 1) return;
+    }
+    try {
+        if (key == KEY_F(2)) {
+            GeneralWindow menu(this);
+            menu.Execute();
+        } else {
+            ShutdownDialog shutdown(this);
+            shutdown.Execute();
+        }
+    } catch (const VelkTimeout&) {
+        // The idle timeout unwound every screen of the session; log out below.
+    }
+    Syslog(LOG_INFO, "User %s logged out.", _loginName.c_str());
+    SetLoggedIn(false);
+    _isLoggedWithSmartCard = false;
+    _loginName.clear();
 }
 
 int WelcomeWindow::Run() {

@@ -159,13 +159,13 @@ bool ParsePaletteOsc(std::string_view body, std::vector<PaletteChange>& changes)
             if (c < '0' || c > '9') return false;
             index = index * 10 + (c - '0');
         }
-        std::string_view spec = parts[p + 1];
-        if (spec.substr(0, 4) != "rgb:") return false;
-        spec.remove_prefix(4);
+        std::string_view colour = parts[p + 1];
+        if (colour.substr(0, 4) != "rgb:") return false;
+        colour.remove_prefix(4);
         uint8_t rgb[3];
         for (int k = 0; k < 3; ++k) {
-            size_t slash = spec.find('/');
-            std::string_view comp = spec.substr(0, slash);
+            size_t slash = colour.find('/');
+            std::string_view comp = colour.substr(0, slash);
             if (comp.empty() || comp.size() > 4 || (k < 2) == (slash == std::string_view::npos)) return false;
             unsigned value = 0;
             for (char c : comp) {
@@ -175,7 +175,7 @@ bool ParsePaletteOsc(std::string_view body, std::vector<PaletteChange>& changes)
             }
             const unsigned max = (1u << (4 * comp.size())) - 1;
             rgb[k] = uint8_t((value * 255 + max / 2) / max);
-            spec.remove_prefix(slash == std::string_view::npos ? spec.size() : slash + 1);
+            colour.remove_prefix(slash == std::string_view::npos ? colour.size() : slash + 1);
         }
         found.push_back({index, {rgb[0], rgb[1], rgb[2]}});
     }

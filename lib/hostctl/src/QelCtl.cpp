@@ -79,6 +79,14 @@ bool SmartCardInfoImpl::GetToken(const SmartCardSlot& slot, SmartCardToken& toke
     return true;
 }
 
+int DriverVmInfoImpl::GetState() { return GetBackend().GetDriverVmState(); }
+
+std::vector<DriverVmDevice> DriverVmInfoImpl::GetDevices() { return GetBackend().GetDriverVmDevices(); }
+
+void DriverVmInfoImpl::SetOwned(const std::vector<std::string>& ownedIds) {
+    GetBackend().SetDriverVmOwned(ownedIds);
+}
+
 }  // namespace Hardware
 
 namespace Network {
@@ -204,6 +212,10 @@ std::string SystemInfoImpl::GetKeyboardLayout() { return GetBackend().GetKeyboar
 void SystemInfoImpl::SetKeyboardLayout(const std::string& layout) { GetBackend().SetKeyboardLayout(layout); }
 
 std::vector<std::string> SystemInfoImpl::GetKeyboardLayouts() { return GetBackend().GetKeyboardLayouts(); }
+
+void SystemInfoImpl::LoadKeyboardMappings(const std::string& layout) {
+    GetBackend().LoadKeyboardMappings(layout);
+}
 
 }  // namespace System
 

@@ -299,6 +299,17 @@ public:
         return Reading([&](const json& s) { return _sim.StringList(s, "/system/keyboardLayouts"); });
     }
 
+    // The simulated console driver only remembers which mappings it holds.
+    void LoadKeyboardMappings(const std::string& layout) override {
+        Writing([&](json& s) {
+            bool known = false;
+            for (const std::string& name : _sim.StringList(s, "/system/keyboardLayouts"))
+                known |= name == layout;
+            if (!known) throw _sim.Error("no key mappings for keyboard layout \"" + layout + "\"");
+            ObjectAt(s, "/system")["loadedKeymap"] = layout;
+        });
+    }
+
     // Options.
 
     std::optional<AdvancedOptionValue> FindAdvancedOption(const std::string& name) override {
@@ -359,6 +370,45 @@ public:
 
     bool HasRunningVirtualMachines() override {
         return Reading([&](const json& s) { return _sim.Unsigned(s, "/vms/running") > 0; });
+    }
+
+    // Driver VM. A host without "/driverVm" has no driver VM and no devices.
+
+    int GetDriverVmState() override {
+        return Reading([&](const json& s) {
+            if (!s.contains("driverVm")) return 0;
+            int64_t state = _sim.Integer(s, "/driverVm/state");
+            if (state < 0 || state > 2) throw _sim.Error("field /driverVm/state must be 0, 1 or 2");
+            return int(state);
+        });
+    }
+
+    std::vector<QelCtl::Hardware::DriverVmDevice> GetDriverVmDevices() override {
+        return Reading([&](const json& s) { return DriverVmDevices(s); });
+    }
+
+    void SetDriverVmOwned(const std::vector<std::string>& ownedIds) override {
+        Writing([&](json& s) {
+            std::vector<QelCtl::Hardware::DriverVmDevice> devices = DriverVmDevices(s);
+            for (const std::string& id : ownedIds) {
+                bool known = false;
+                for (const auto& d : devices) known = known || d.id == id;
+                if (!known) throw _sim.Error("no driver VM device \"" + id + "\"");
+            }
+            auto wanted = [&](const std::string& id) {
+                for (const std::string& o : ownedIds)
+                    if (o == id) return true;
+                return false;
+            };
+            for (const auto& d : devices) {
+                for (const auto& other : devices) {
+                    if (!d.group.empty() && d.group == other.group && wanted(d.id) != wanted(other.id))
+                        throw _sim.Error("devices of group \"" + d.group + "\" change owner together");
+                }
+            }
+            json& list = s["driverVm"]["devices"];
+            for (size_t i = 0; i < devices.size(); ++i) list[i]["owned"] = wanted(devices[i].id);
+        });
     }
 
 private:
@@ -431,6 +481,22 @@ private:
         if (text == "dhcp") return Ipv6AddressType::Dhcp;
         if (text == "autoconf") return Ipv6AddressType::Autoconf;
         throw _sim.Error("field " + pointer + " must be \"static\", \"dhcp\" or \"autoconf\"");
+    }
+
+    std::vector<QelCtl::Hardware::DriverVmDevice> DriverVmDevices(const json& s) const {
+        std::vector<QelCtl::Hardware::DriverVmDevice> devices;
+        if (!s.contains("driverVm")) return devices;
+        const std::string list = "/driverVm/devices";
+        for (size_t i = 0; i < _sim.Array(s, list).size(); ++i) {
+            const std::string p = At(list, i);
+            QelCtl::Hardware::DriverVmDevice device;
+            device.id = _sim.String(s, p + "/id");
+            device.name = _sim.String(s, p + "/name");
+            device.group = _sim.String(s, p + "/group");
+            device.owned = _sim.Bool(s, p + "/owned");
+            devices.push_back(std::move(device));
+        }
+        return devices;
     }
 
     AdvancedOptionValue OptionValue(const json& s, const std::string& name) const {

@@ -114,6 +114,12 @@ const char* const DEFAULT_STATE = R"({
   "hostAgent": {"lockdownEnabled": false, "lockdownPossible": true, "users": ["root", "velk"]},
   "services": {"ssh": {"enabled": false, "running": false}, "tarnShell": {"enabled": false, "running": false}},
   "vms": {"running": 0},
+  "driverVm": {"state": 0, "devices": [
+    {"id": "0000:03:00.0", "name": "Acme SATA Controller", "owned": false, "group": "g1"},
+    {"id": "0000:03:00.1", "name": "Acme SATA Controller, second port", "owned": false, "group": "g1"},
+    {"id": "0000:05:00.0", "name": "Brightwave 10G Ethernet Adapter", "owned": true, "group": "g2"},
+    {"id": "0000:06:00.0", "name": "Kestrel RAID Controller", "owned": false, "group": "g3"}
+  ]},
   "history": []
 })";
 

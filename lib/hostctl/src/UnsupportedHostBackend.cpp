@@ -52,6 +52,7 @@ public:
     std::string GetKeyboardLayout() override { Unavailable("reading the keyboard layout"); }
     void SetKeyboardLayout(const std::string&) override { Unavailable("setting the keyboard layout"); }
     std::vector<std::string> GetKeyboardLayouts() override { Unavailable("listing the keyboard layouts"); }
+    void LoadKeyboardMappings(const std::string&) override { Unavailable("loading the keyboard mappings"); }
 
     std::optional<AdvancedOptionValue> FindAdvancedOption(const std::string&) override {
         Unavailable("reading an advanced option");
@@ -69,6 +70,14 @@ public:
     }
 
     bool HasRunningVirtualMachines() override { Unavailable("looking for running virtual machines"); }
+
+    int GetDriverVmState() override { Unavailable("reading the driver VM state"); }
+    std::vector<QelCtl::Hardware::DriverVmDevice> GetDriverVmDevices() override {
+        Unavailable("listing the driver VM devices");
+    }
+    void SetDriverVmOwned(const std::vector<std::string>&) override {
+        Unavailable("setting the driver VM devices");
+    }
 };
 
 }  // namespace

@@ -212,6 +212,16 @@ TEST_F(SimBackendTest, KeyboardLayoutMustBeKnown) {
     EXPECT_EQ(system.GetKeyboardLayouts().size(), 29u);
 }
 
+TEST_F(SimBackendTest, KeyboardMappingsLoadOnlyForKnownLayouts) {
+    QelCtl::System::SystemInfoImpl system;
+    system.LoadKeyboardMappings("German");
+    EXPECT_EQ(State()["system"]["loadedKeymap"], "German");
+    EXPECT_THROW(system.LoadKeyboardMappings("Klingon"), HostCtlException);
+    EXPECT_EQ(State()["system"]["loadedKeymap"], "German");
+    // Loading mappings does not change the configured layout.
+    EXPECT_NE(system.GetKeyboardLayout(), "German");
+}
+
 TEST_F(SimBackendTest, EveryCallReadsTheHostAgain) {
     QelCtl::Network::NetworkInfoImpl network;
     QelCtl::System::SystemInfoImpl system;
@@ -238,6 +248,57 @@ TEST_F(SimBackendTest, EveryCallReadsTheHostAgain) {
     system.SetSystemAlert("disk failing");
     EXPECT_EQ(State()["network"]["ipv6Enabled"], true);
     EXPECT_EQ(State()["system"]["systemAlert"], "disk failing");
+}
+
+}  // namespace
+
+namespace {
+
+using HostCtl::Lib::HostCtlException;
+using nlohmann::json;
+using QelCtl::Hardware::DriverVmDevice;
+using QelCtl::Hardware::DriverVmInfoImpl;
+
+using DriverVmTest = HostCtlTest::SimHostTest;
+
+std::vector<std::string> OwnedIds(const std::vector<DriverVmDevice>& devices) {
+    std::vector<std::string> ids;
+    for (const DriverVmDevice& d : devices)
+        if (d.owned) ids.push_back(d.id);
+    return ids;
+}
+
+TEST_F(DriverVmTest, OwnershipRoundTripKeepsGroupsTogether) {
+    DriverVmInfoImpl info;
+    EXPECT_EQ(info.GetState(), 0);
+    std::vector<DriverVmDevice> devices = info.GetDevices();
+    ASSERT_GE(devices.size(), 3u);
+    EXPECT_EQ(devices[0].id, "0000:03:00.0");
+    EXPECT_EQ(devices[0].name, "Acme SATA Controller");
+    EXPECT_EQ(devices[0].group, devices[1].group);
+
+    info.SetOwned({devices[0].id, devices[1].id});
+    EXPECT_EQ(OwnedIds(info.GetDevices()), (std::vector<std::string>{devices[0].id, devices[1].id}));
+
+    // Half a group or an unknown device is refused and changes nothing.
+    const std::string before = HostCtlTest::ReadFile(StatePath());
+    for (const std::vector<std::string>& bad :
+         {std::vector<std::string>{devices[0].id}, std::vector<std::string>{"0000:99:00.0"}}) {
+        EXPECT_THROW(info.SetOwned(bad), HostCtlException);
+    }
+    EXPECT_EQ(HostCtlTest::ReadFile(StatePath()), before);
+
+    info.SetOwned({});
+    EXPECT_TRUE(OwnedIds(info.GetDevices()).empty());
+
+    // A host without a driver VM, and one whose state is out of range.
+    Edit([](json& s) { s.erase("driverVm"); });
+    EXPECT_EQ(info.GetState(), 0);
+    EXPECT_TRUE(info.GetDevices().empty());
+    Edit([](json& s) { s["driverVm"] = {{"state", 7}, {"devices", json::array()}}; });
+    EXPECT_THROW(info.GetState(), HostCtlException);
+    Edit([](json& s) { s["driverVm"]["state"] = 2; });
+    EXPECT_EQ(info.GetState(), 2);
 }
 
 }  // namespace

@@ -247,7 +247,7 @@ TEST_F(HostTools, HostCommandNeedsARootAndAKnownTool) {
     const std::vector<std::vector<std::string>> cases = {
         {VELK_HOSTCMD_BIN},
         {VELK_HOSTCMD_BIN, "--root", _root},
-        {VELK_HOSTCMD_BIN, "--root", _root, "reboot"},
+        {VELK_HOSTCMD_BIN, "--root", _root, "halt"},
         {VELK_HOSTCMD_BIN, "hrm-cmd", "-U", "root", "internalsvc/refresh"},  // no root, no VELK_HOST_ROOT
     };
     for (const auto& argv : cases) {
@@ -260,6 +260,49 @@ TEST_F(HostTools, HostCommandNeedsARootAndAKnownTool) {
     EXPECT_EQ(fromEnv.status, 0) << fromEnv.err;
     EXPECT_EQ(fromEnv.out, "ASSET-0042\n");
     EXPECT_TRUE(State()["history"].empty());
+}
+
+}  // namespace
+}  // namespace ToolTest
+
+namespace ToolTest {
+namespace {
+
+// The console runs "reboot -f" through sh with the host's folders as PATH,
+// and the other power tools by their host paths; none of them may reach the
+// machine itself.
+TEST_F(HostTools, PowerToolsRecordAndNeverTouchTheMachine) {
+    const std::vector<std::string> shellEnv = {"PATH=" + _root + "/sbin:" + _root + "/bin"};
+    ASSERT_EQ(Tool("/sbin/firmwareConfig.sh", {"--reset-only"}).status, 0);
+    Result r = Run({"/bin/sh", "-c", "reboot -f"}, shellEnv);
+    ASSERT_EQ(r.status, 0) << r.err;
+    EXPECT_EQ(State()["power"]["state"], "rebooting");
+    ASSERT_EQ(Tool("/sbin/poweroff", {}).status, 0);
+
+    // Bad arguments fail and record nothing.
+    for (const auto& [path, args] : std::vector<std::pair<std::string, std::vector<std::string>>>{
+             {"/sbin/reboot", {"--now"}}, {"/sbin/poweroff", {"-x"}}, {"/sbin/firmwareConfig.sh", {}}}) {
+        Result bad = Tool(path, args);
+        EXPECT_EQ(bad.status, 1) << path;
+        EXPECT_NE(bad.err.find("usage"), std::string::npos) << bad.err;
+    }
+
+    json state = State();
+    EXPECT_EQ(state["power"]["state"], "off");
+    EXPECT_EQ(state["power"]["resetDone"], true);
+    const json expected[] = {
+        {{"tool", "firmwareConfig.sh"}, {"args", {"--reset-only"}}},
+        {{"tool", "reboot"}, {"args", {"-f"}}},
+        {{"tool", "poweroff"}, {"args", json::array()}},
+    };
+    const json& history = state["history"];
+    ASSERT_EQ(history.size(), std::size(expected));
+    for (size_t i = 0; i < history.size(); ++i) {
+        SCOPED_TRACE(i);
+        EXPECT_EQ(history[i]["tool"], expected[i]["tool"]);
+        EXPECT_EQ(history[i]["args"], expected[i]["args"]);
+        EXPECT_EQ(history[i]["seq"], i + 1);
+    }
 }
 
 }  // namespace

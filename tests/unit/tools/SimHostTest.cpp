@@ -268,3 +268,55 @@ TEST_F(SimHostState, BadInputIsOneLineAndLeavesTheStateAlone) {
 
 }  // namespace
 }  // namespace ToolTest
+
+namespace ToolTest {
+namespace {
+
+using SimHostPam = HostTest;
+
+// The host's PAM services: the console's service checks passwords against
+// the host's own file, every other service denies.
+TEST_F(SimHostPam, ServicesAndDemoLogin) {
+    Result login = SimHost({"login", _root});
+    ASSERT_EQ(login.status, 0) << login.err;
+    EXPECT_TRUE(std::regex_match(login.out, std::regex("Demo login: user root, password demo-[a-z0-9]{6}\n")))
+        << login.out;
+
+    const std::string dir = _root + "/etc/pam-wrapper";
+    const std::string velk = ReadFile(dir + "/velk");
+    for (const char* type : {"auth", "account", "password"}) {
+        SCOPED_TRACE(type);
+        std::smatch m;
+        ASSERT_TRUE(
+            std::regex_search(velk, m,
+                              std::regex(std::string("(^|\n)") + type +
+                                         "\\s+required\\s+(/\\S+/pam_matrix\\.so)\\s+\\[passdb=(.*)\\]\n")))
+            << velk;
+        EXPECT_TRUE(fs::exists(m[2].str())) << m[2];
+        // The root holds a blank, so the argument is bracketed.
+        EXPECT_EQ(m[3].str(), dir + "/passdb");
+    }
+    EXPECT_EQ(
+        ReadFile(dir + "/other"),
+        "auth\trequired\tpam_deny.so\naccount\trequired\tpam_deny.so\npassword\trequired\tpam_deny.so\n");
+
+    const std::string other = _dir + "/other";
+    ASSERT_EQ(SimHost({"create", other, "--password", "s3cret pass"}).status, 0);
+    EXPECT_EQ(ReadFile(other + "/etc/pam-wrapper/passdb"), "root:s3cret pass:velk\nguest:guest-pass:other\n");
+    EXPECT_EQ(SimHost({"login", other}).out, "Demo login: user root, password s3cret pass\n");
+
+    for (const std::vector<std::string>& bad :
+         std::vector<std::vector<std::string>>{{"create", _dir + "/bad1", "--password", "a:b"},
+                                               {"create", _dir + "/bad2", "--password", ""},
+                                               {"create", _dir + "/bad3", "--password"},
+                                               {"login", _dir + "/missing"},
+                                               {"login"}}) {
+        Result r = SimHost(bad);
+        EXPECT_EQ(r.status, 1) << bad[0];
+        EXPECT_EQ(Lines(r.err) >= 1, true);
+    }
+    EXPECT_FALSE(fs::exists(_dir + "/bad1/host.json"));
+}
+
+}  // namespace
+}  // namespace ToolTest

@@ -100,6 +100,8 @@ public:
     virtual std::string GetKeyboardLayout() = 0;
     virtual void SetKeyboardLayout(const std::string& layout) = 0;
     virtual std::vector<std::string> GetKeyboardLayouts() = 0;
+    // Loads the key mappings of a layout into the console driver.
+    virtual void LoadKeyboardMappings(const std::string& layout) = 0;
 
     // Options.
     virtual std::optional<AdvancedOptionValue> FindAdvancedOption(const std::string& name) = 0;
@@ -113,6 +115,11 @@ public:
 
     // Virtual machines.
     virtual bool HasRunningVirtualMachines() = 0;
+
+    // Driver VM: its state (0 when the host has none) and the devices it can own.
+    virtual int GetDriverVmState() = 0;
+    virtual std::vector<QelCtl::Hardware::DriverVmDevice> GetDriverVmDevices() = 0;
+    virtual void SetDriverVmOwned(const std::vector<std::string>& ownedIds) = 0;
 };
 
 // The process's backend, chosen by InitHost() (called on first use).

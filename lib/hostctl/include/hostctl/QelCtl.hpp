@@ -84,6 +84,25 @@ public:
     bool GetToken(const SmartCardSlot& slot, SmartCardToken& token);
 };
 
+// A PCI device that can be handed to the driver virtual machine. Devices of
+// one group change owner together.
+struct DriverVmDevice {
+    std::string id;  // PCI address, "0000:03:00.0"
+    std::string name;
+    std::string group;
+    bool owned = false;
+};
+
+class DriverVmInfoImpl {
+public:
+    // 0: no driver VM on this host, 1 and 2: the driver VM's states.
+    int GetState();
+    std::vector<DriverVmDevice> GetDevices();
+    // Gives exactly the devices in ownedIds to the driver VM; an unknown id
+    // throws and changes nothing.
+    void SetOwned(const std::vector<std::string>& ownedIds);
+};
+
 }  // namespace Hardware
 
 namespace Network {
@@ -157,6 +176,8 @@ public:
     std::string GetKeyboardLayout();
     void SetKeyboardLayout(const std::string& layout);
     std::vector<std::string> GetKeyboardLayouts();
+    // Makes the console use the key mappings of that layout now.
+    void LoadKeyboardMappings(const std::string& layout);
 };
 
 }  // namespace System

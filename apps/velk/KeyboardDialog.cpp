@@ -1,0 +1,77 @@
+#include "KeyboardDialog.hpp"
+
+#include <syslog.h>
+
+#include <algorithm>
+
+#include "StringFactory.hpp"
+#include "hostctl/Host.hpp"
+
+namespace Velk {
+
+KeyboardDialog::KeyboardDialog(Frame* parent) : Dialog(parent, 76, 18, 6) {
+    // Host errors leave the constructor: the base classes free the windows.
+    const std::string current = _systemInfo.GetKeyboardLayout();
+    _layouts = _systemInfo.GetKeyboardLayouts();
+    // When the current layout is not offered, nothing is marked and Enter
+    // applies the first layout unless Space marks another.
+    for (size_t i = 0; i < _layouts.size(); ++i) {
+        const bool marked = _layouts[i] == current;
+        _items.push_back(new RadioItem(_layouts[i], marked));
+        if (marked) _checkedIndex = i;
+    }
+    _list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
+    _list->SetItems(std::vector<Item*>(_items.begin(), _items.end()));
+}
+
+KeyboardDialog::~KeyboardDialog() {
+    delete _list;
+    for (RadioItem* item : _items) delete item;
+}
+
+int KeyboardDialog::Run() {
+    SetTitle(_factory->GetString(16));
+    SetDescription(_factory->GetString(255));
+    _list->Draw();
+    SetFooter(
+        "{color:black}<Up/Down>{/color} {color:dark-grey}Select{/color}  {color:black}<Space>{/color} "
+        "{color:dark-grey}Toggle Selected{/color}{align:right}{color:black}<Enter>{/color} "
+        "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}");
+    Refresh();
+    for (;;) {
+        const int key = GetKey(true);
+        switch (key) {
+            case ' ': {
+                const auto it = std::find(_items.begin(), _items.end(), _list->GetCurrent());
+                if (it == _items.end()) break;
+                _items[_checkedIndex]->SetSelected(false);
+                _checkedIndex = static_cast<size_t>(it - _items.begin());
+                _items[_checkedIndex]->SetSelected(true);
+                _list->Draw();
+                break;
+            }
+            case KEY_DOWN:
+                _list->Down();
+                break;
+            case KEY_UP:
+                _list->Up();
+                break;
+            case '\n': {
+                if (_layouts.empty()) break;
+                // The marked layout is applied, not the one under the cursor,
+                // and the host is told again even when nothing changed.
+                const std::string& layout = _layouts[_checkedIndex];
+                _systemInfo.SetKeyboardLayout(layout);
+                _systemInfo.LoadKeyboardMappings(layout);
+                HostCtl::Lib::Syslog(LOG_INFO, "Keyboard Layout changed to %s", layout.c_str());
+                return 1;
+            }
+            case 27:
+                return 0;
+            default:
+                break;
+        }
+    }
+}
+
+}  // namespace Velk

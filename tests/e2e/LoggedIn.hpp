@@ -1,0 +1,58 @@
+// Helpers for cases that log in to the console: the console runs with the PAM
+// wrapper pointed at the host root's own services and password file, so that
+// logging in needs no change to the machine's PAM set-up.
+#pragma once
+
+#include <nlohmann/json.hpp>
+#include <string>
+#include <vector>
+
+#include "SimHost.hpp"
+#include "Terminal.hpp"
+
+namespace E2e {
+
+// The password root has on every host of these tests.
+inline constexpr char kRootPassword[] = "Velk-e2e-7";
+// A user who authenticates but whose account may not use the console.
+inline constexpr char kGuest[] = "guest";
+inline constexpr char kGuestPassword[] = "guest-pass";
+
+// Gives root kRootPassword in the host's password file.
+void SetRootPassword(const SimHost& host, const std::string& password = kRootPassword);
+
+// How to run the console on `host` with the PAM wrapper; sanitizer settings
+// are completed so that the preloaded wrapper is accepted and its known leak
+// ignored.
+TerminalOptions PamConsole(const SimHost& host, const std::string& term = "linux", int cols = 80,
+                           int rows = 25);
+
+// The welcome screen, recognised by its footer (the shut-down dialog's title
+// also reads "Shut Down/Restart").
+::testing::AssertionResult WaitForWelcome(Terminal& t, Duration timeout = kDefaultTimeout);
+// The system customization menu.
+::testing::AssertionResult WaitForMenu(Terminal& t);
+
+// Presses `key` on the welcome screen, waits for the login dialog and
+// submits `password` for `user` ("" keeps the prefilled name).
+::testing::AssertionResult SubmitLogin(Terminal& t, const std::string& password, const std::string& user = "",
+                                       const std::string& key = "F2");
+// SubmitLogin with root's password, then waits for the main menu.
+::testing::AssertionResult LogInToMenu(Terminal& t, const std::string& password = kRootPassword);
+
+// Moves the menu selection with Down (Up when `up`) until `entry` is the
+// selected entry, that is until its name also heads the right pane.
+::testing::AssertionResult SelectEntry(Terminal& t, const std::string& entry, bool up = false);
+
+// Entries of /history, in order, whose "tool" is one of `tools`.
+std::vector<nlohmann::json> History(const SimHost& host, const std::vector<std::string>& tools);
+// Waits until some history entry has tool `tool`.
+::testing::AssertionResult WaitForHistory(const SimHost& host, const std::string& tool,
+                                          Duration timeout = kDefaultTimeout);
+// Waits until the host's log has a line containing `text`.
+::testing::AssertionResult WaitForLog(const SimHost& host, const std::string& text,
+                                      Duration timeout = kDefaultTimeout);
+
+std::string Joined(const std::vector<std::string>& lines);
+
+}  // namespace E2e

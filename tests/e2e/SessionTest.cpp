@@ -1,0 +1,271 @@
+// What a logged-in user does with the real console: shutting down and
+// restarting the host, resetting its configuration, reading the logs,
+// choosing the keyboard layout, changing the password, and being logged out
+// after a time without keys.
+#include <thread>
+
+#include "LoggedIn.hpp"
+
+namespace E2e {
+namespace {
+
+using nlohmann::json;
+
+std::vector<std::string> Tools(const std::vector<json>& entries) {
+    std::vector<std::string> tools;
+    for (const auto& e : entries) tools.push_back(e.value("tool", ""));
+    return tools;
+}
+
+// The host-agent requests and power tools of the history, in order; of the
+// agent requests only the auto-stop.
+std::vector<json> PowerHistory(const SimHost& host) {
+    std::vector<json> found;
+    for (const json& e :
+         History(host, {"hrm-cmd", "powerOffVms", "poweroff", "reboot", "firmwareConfig.sh"})) {
+        if (e.value("tool", "") == "hrm-cmd" && e.value("command", "") != "hostsvc/autostartmanager/autostop")
+            continue;
+        found.push_back(e);
+    }
+    return found;
+}
+
+struct PowerCase {
+    const char* name;
+    const char* key;  // in the shut-down dialog
+    bool terminate;   // Space on "Forcefully terminate running VMs" first
+    const char* tool;
+    const char* logLine;
+    const char* progressTitle;
+    const char* progressText;
+};
+void PrintTo(const PowerCase& c, std::ostream* os) { *os << c.name; }
+
+class PowerTest : public ::testing::TestWithParam<PowerCase> {};
+
+TEST_P(PowerTest, StopsVmsThenPowersTheHost) {
+    const PowerCase& c = GetParam();
+    SimHost host;
+    SetRootPassword(host);
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(SubmitLogin(t, kRootPassword, "", "F12"));
+    ASSERT_TRUE(t.WaitForText("Forcefully terminate running VMs")) << t.Dump();
+    EXPECT_TRUE(t.Contains("Remote management software is recommended")) << t.Dump();
+    EXPECT_FALSE(t.Contains("System Customization")) << t.Dump();
+
+    // Keys the dialog does not know change nothing.
+    t.SendKey("Enter");
+    t.SendKey("F3");
+    ASSERT_TRUE(t.WaitQuiet());
+    EXPECT_TRUE(t.Contains("Forcefully terminate running VMs")) << t.Dump();
+    if (c.terminate) {
+        // Twice is clear again, three times set.
+        for (int i = 0; i < 3; ++i) t.Send(" ");
+        ASSERT_TRUE(t.WaitQuiet());
+    }
+    t.SendKey(c.key);
+    ASSERT_TRUE(t.WaitForText(c.progressTitle)) << t.Dump();
+    ASSERT_TRUE(WaitForHistory(host, c.tool));
+
+    const std::vector<json> power = PowerHistory(host);
+    ASSERT_EQ(Tools(power), (std::vector<std::string>{"hrm-cmd", "powerOffVms", c.tool}))
+        << json(power).dump(1);
+    EXPECT_EQ(power[0].value("user", ""), "root") << power[0].dump();
+    EXPECT_EQ(power[1]["args"], c.terminate ? json{"--terminate"} : json::array()) << power[1].dump();
+    EXPECT_EQ(power[2]["args"], json::array()) << power[2].dump();
+    EXPECT_LT(power[0]["seq"], power[1]["seq"]);
+    EXPECT_LT(power[1]["seq"], power[2]["seq"]);
+
+    // Once, at informational level (the observation event repeats the text).
+    EXPECT_EQ(host.ConsoleLog(std::string("user.info: ") + c.logLine, t.Pid()).size(), 1u)
+        << Joined(host.SyslogLines());
+
+    // The progress screen stays whatever is pressed.
+    EXPECT_TRUE(t.Contains(c.progressText)) << t.Dump();
+    for (const char* key : {"Esc", "Enter", "F2"}) t.SendKey(key);
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t.Contains(c.progressTitle)) << t.Dump();
+    EXPECT_FALSE(t.HasExited());
+    EXPECT_EQ(PowerHistory(host).size(), 3u) << host.Get("/history").dump(1);
+}
+
+const PowerCase kPowerCases[] = {
+    {"ShutDown", "F2", false, "poweroff", "Shutting down host", "Shut Down Host", "Shutdown in progress..."},
+    {"ShutDownTerminatingVms", "F2", true, "poweroff", "Shutting down host", "Shut Down Host",
+     "Shutdown in progress..."},
+    {"Restart", "F11", false, "reboot", "Rebooting host", "Restart Host", "Restart in progress..."},
+    {"RestartTerminatingVms", "F11", true, "reboot", "Rebooting host", "Restart Host",
+     "Restart in progress..."},
+};
+
+INSTANTIATE_TEST_SUITE_P(Keys, PowerTest, ::testing::ValuesIn(kPowerCases),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+TEST(PowerTest, EscLeavesTheShutdownDialogLoggedOut) {
+    SimHost host;
+    SetRootPassword(host);
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(SubmitLogin(t, kRootPassword, "", "F12"));
+    ASSERT_TRUE(t.WaitForText("Forcefully terminate running VMs")) << t.Dump();
+    t.SendKey("Esc");
+    ASSERT_TRUE(t.WaitForTextGone("Forcefully terminate running VMs")) << t.Dump();
+    EXPECT_TRUE(t.Contains("Customize System/View Logs")) << t.Dump();
+    EXPECT_TRUE(PowerHistory(host).empty()) << host.Get("/history").dump(1);
+    EXPECT_EQ(host.ConsoleLog("User root logged out.", t.Pid()).size(), 1u) << Joined(host.SyslogLines());
+}
+
+TEST(ResetTest, F11ResetsThenEnterRestarts) {
+    SimHost host;
+    SetRootPassword(host);
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    ASSERT_TRUE(SelectEntry(t, "Reset System Configuration"));
+    t.SendKey("Enter");
+    ASSERT_TRUE(t.WaitForText("Reset System Configuration now?")) << t.Dump();
+    EXPECT_TRUE(t.Contains("Reset System Configuration: Confirm")) << t.Dump();
+
+    // Enter is not the confirming key.
+    t.SendKey("Enter");
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t.Contains("Reset System Configuration now?")) << t.Dump();
+    EXPECT_TRUE(PowerHistory(host).empty()) << host.Get("/history").dump(1);
+
+    t.SendKey("F11");
+    ASSERT_TRUE(t.WaitForText("Default settings are restored. Press <Enter> to")) << t.Dump();
+    EXPECT_TRUE(t.Contains("restart your host.")) << t.Dump();
+    ASSERT_TRUE(WaitForHistory(host, "firmwareConfig.sh"));
+    EXPECT_TRUE(WaitForLog(host, "user.info: Restoring factory defaults"));
+
+    // No way back once the reset has run.
+    t.SendKey("Esc");
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t.Contains("Default settings are restored.")) << t.Dump();
+    EXPECT_TRUE(t.Contains("<Enter> Restart Host")) << t.Dump();
+    EXPECT_EQ(Tools(PowerHistory(host)), std::vector<std::string>{"firmwareConfig.sh"});
+
+    t.SendKey("Enter");
+    ASSERT_TRUE(WaitForHistory(host, "reboot"));
+    const std::vector<json> power = PowerHistory(host);
+    ASSERT_EQ(Tools(power), (std::vector<std::string>{"firmwareConfig.sh", "reboot"})) << json(power).dump(1);
+    EXPECT_EQ(power[0]["args"], json{"--reset-only"});
+    EXPECT_EQ(power[1]["args"], json{"-f"});
+}
+
+TEST(LogViewerTest, DigitOpensTheLogInThePagerAndQReturns) {
+    SimHost host;
+    SetRootPassword(host);
+    const std::string marker = "e2e-marker-line for the pager";
+    host.WriteFile("/var/log/syslog.log", host.ReadFile("/var/log/syslog.log") +
+                                              "2024-01-01T00:00:00Z e2e[1]: user.info: " + marker + "\n");
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    ASSERT_TRUE(SelectEntry(t, "View System Logs"));
+    ASSERT_TRUE(t.WaitForText("<1> Syslog")) << t.Dump();
+    EXPECT_TRUE(t.Contains("<7> Zolva Tarni Observation log")) << t.Dump();
+
+    t.Send("1");
+    ASSERT_TRUE(t.WaitForText(marker)) << t.Dump();
+    EXPECT_TRUE(t.Contains("<Q> Quit </> RegExp Search <H> Help")) << t.Dump();
+    EXPECT_FALSE(t.Contains("System Customization")) << t.Dump();
+
+    t.Send("q");
+    ASSERT_TRUE(WaitForMenu(t)) << t.Dump();
+    EXPECT_TRUE(t.Contains("<1> Syslog")) << t.Dump();
+    EXPECT_FALSE(t.Contains(marker)) << t.Dump();
+    // The console reads keys again.
+    t.SendKey("Esc");
+    EXPECT_TRUE(WaitForWelcome(t)) << t.Dump();
+}
+
+TEST(KeyboardTest, SpaceMarksEnterApplies) {
+    SimHost host;
+    SetRootPassword(host);
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    ASSERT_TRUE(SelectEntry(t, "Configure Keyboard"));
+    t.SendKey("Enter");
+    ASSERT_TRUE(t.WaitForText("If you are having difficulty using your keyboard")) << t.Dump();
+
+    // The list starts at the current layout's place or at the top: move to
+    // the first entry, then two down ("Brazilian" -> "Croatian").
+    for (int i = 0; i < 40; ++i) t.SendKey("Up");
+    t.SendKey("Down");
+    t.SendKey("Down");
+    t.Send(" ");
+    t.SendKey("Enter");
+    ASSERT_TRUE(WaitForMenu(t)) << t.Dump();
+    ASSERT_TRUE(WaitForLog(host, "user.info: Keyboard Layout changed to Croatian"));
+    EXPECT_EQ(host.Get("/system/keyboardLayout"), "Croatian");
+    EXPECT_EQ(host.Get("/system/loadedKeymap"), "Croatian");
+}
+
+TEST(KeyboardTest, EscChangesNothing) {
+    SimHost host;
+    SetRootPassword(host);
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    ASSERT_TRUE(SelectEntry(t, "Configure Keyboard"));
+    t.SendKey("Enter");
+    ASSERT_TRUE(t.WaitForText("If you are having difficulty using your keyboard")) << t.Dump();
+    t.SendKey("Down");
+    t.Send(" ");
+    t.SendKey("Esc");
+    ASSERT_TRUE(t.WaitForTextGone("If you are having difficulty using your keyboard")) << t.Dump();
+    EXPECT_TRUE(t.Contains("System Customization")) << t.Dump();
+    EXPECT_EQ(host.Get("/system/keyboardLayout"), "US Default");
+    EXPECT_TRUE(host.ConsoleLog("Keyboard Layout changed").empty()) << Joined(host.SyslogLines());
+}
+
+TEST(PasswordTest, NewPasswordWorksOldOneNoLonger) {
+    SimHost host;
+    SetRootPassword(host);
+    const std::string fresh = "Fresh-pass-42";
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    ASSERT_TRUE(SelectEntry(t, "Configure Password"));
+    t.SendKey("Enter");
+    ASSERT_TRUE(t.WaitForText("Old Password:")) << t.Dump();
+    for (const std::string& field : {std::string(kRootPassword), fresh, fresh}) {
+        t.Send(field);
+        t.SendKey("Enter");
+        ASSERT_TRUE(t.WaitQuiet());
+    }
+    ASSERT_TRUE(t.WaitForTextGone("Old Password:")) << t.Dump();
+    ASSERT_TRUE(WaitForMenu(t)) << t.Dump();
+    EXPECT_TRUE(host.ConsoleLog(fresh).empty()) << "the password reached the log";
+    t.SendKey("Esc");
+    ASSERT_TRUE(WaitForWelcome(t)) << t.Dump();
+
+    ASSERT_TRUE(SubmitLogin(t, kRootPassword));
+    ASSERT_TRUE(t.WaitForText("Invalid login or password.")) << t.Dump();
+    t.SendKey("Enter");
+    ASSERT_TRUE(t.WaitForTextGone("Invalid login or password.")) << t.Dump();
+    t.Send(fresh);
+    t.SendKey("Enter");
+    EXPECT_TRUE(WaitForMenu(t)) << t.Dump();
+}
+
+TEST(IdleTimeoutTest, MenuLogsOutAfterAMinuteWithoutKeys) {
+    SimHost host;
+    SetRootPassword(host);
+    host.Set("/advancedOptions/~1UserVars~1VelkTimeOut", 60);
+    Terminal t(PamConsole(host));
+    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    const auto in = std::chrono::steady_clock::now();
+    ASSERT_TRUE(WaitForWelcome(t, Duration(75000))) << t.Dump();
+    const auto after = std::chrono::steady_clock::now() - in;
+    EXPECT_GE(after, std::chrono::seconds(55));
+    EXPECT_FALSE(t.Contains("System Customization")) << t.Dump();
+    EXPECT_EQ(host.ConsoleLog("User root logged out.", t.Pid()).size(), 1u) << Joined(host.SyslogLines());
+}
+
+}  // namespace
+}  // namespace E2e
