@@ -40,6 +40,9 @@ TerminalOptions PamConsole(const SimHost& host, const std::string& term, int col
         env.push_back(entry);
     }
     env.push_back("PAM_WRAPPER=1");
+    // The wrapper loads libpam with RTLD_DEEPBIND, which the sanitizer runtime
+    // refuses (the console would end at its first login); this turns it off.
+    env.push_back("UID_WRAPPER_DISABLE_DEEPBIND=1");
     env.push_back("LD_PRELOAD=libpam_wrapper.so");
     env.push_back("PAM_WRAPPER_SERVICE_DIR=" + host.Path("/etc/pam-wrapper"));
     // Under AddressSanitizer the runtime must accept a library preloaded ahead
