@@ -51,7 +51,8 @@ long WakeUps(pid_t pid) {
         while (dirent* e = readdir(d)) {
             if (e->d_name[0] == '.') continue;
             const std::string status = dir + "/" + e->d_name + "/status";
-            total += StatusField(status, "voluntary_ctxt_switches:") + StatusField(status, "nonvoluntary_ctxt_switches:");
+            total += StatusField(status, "voluntary_ctxt_switches:") +
+                     StatusField(status, "nonvoluntary_ctxt_switches:");
         }
         closedir(d);
     }
@@ -80,7 +81,8 @@ Clock::time_point SettleAfter(Terminal& t, size_t before, Clock::time_point sent
             if (first == Clock::time_point{}) first = Clock::now();
             last = now;
             lastChange = Clock::now();
-        } else if (first != Clock::time_point{} && Clock::now() - lastChange > std::chrono::milliseconds(30)) {
+        } else if (first != Clock::time_point{} &&
+                   Clock::now() - lastChange > std::chrono::milliseconds(30)) {
             break;
         }
         std::this_thread::sleep_for(std::chrono::microseconds(200));
@@ -142,7 +144,34 @@ void Row(const char* name, double velk, double minimal, const char* unit) {
 
 }  // namespace
 
-int main() {
+// Upper bounds for --check: byte ratios are exact for a given screen and
+// curses version, so they make a stable guard against redraws that send more
+// than they must; times are never checked.
+constexpr double kMaxFirstFrameBytesRatio = 2.0;
+constexpr double kMaxBytesPerKeyRatio = 6.0;
+
+// With --check, the figures are also judged: the console must reach its
+// menu, stay below the byte ratios above, and not wake up while idle.
+int Check(const Figures& velk, const Figures& minimal) {
+    int failures = 0;
+    auto fail = [&](const char* what, double limit) {
+        std::printf("CHECK FAILED: %s", what);
+        if (limit > 0) std::printf(" above %.1fx", limit);
+        std::printf("\n");
+        ++failures;
+    };
+    if (velk.firstFrameBytes > kMaxFirstFrameBytesRatio * minimal.firstFrameBytes)
+        fail("bytes to first frame", kMaxFirstFrameBytesRatio);
+    if (!velk.menu)
+        fail("could not log in to the main menu", 0);
+    else if (velk.bytesPerKey > kMaxBytesPerKeyRatio * minimal.bytesPerKey)
+        fail("bytes per Up/Down key", kMaxBytesPerKeyRatio);
+    if (velk.idleWakeUps > 0) fail("the console woke up while idle", 0);
+    return failures == 0 ? 0 : 1;
+}
+
+int main(int argc, char** argv) {
+    const bool check = argc > 1 && std::string(argv[1]) == "--check";
     E2e::SimHost host("bench");
     // The root account's password, from the host's PAM user table.
     std::string password;
@@ -193,5 +222,5 @@ int main() {
     }
     Row("peak resident memory", velk.peakRssKb, minimal.peakRssKb, "KiB");
     Row("wake-ups in 5 idle seconds", velk.idleWakeUps, minimal.idleWakeUps, "context switches");
-    return 0;
+    return check ? Check(velk, minimal) : 0;
 }

@@ -15,10 +15,22 @@ int main() {
     curs_set(0);
     init_pair(1, COLOR_BLACK, COLOR_YELLOW);
     init_pair(2, COLOR_WHITE, COLOR_BLACK);
-    const char* entries[] = {"Configure Password", "Configure Lockdown Mode", "", "Configure Devices",
-                             "Configure Management Network", "Restart Management Network",
-                             "Test Management Network", "Network Restore Options", "", "Configure Keyboard",
-                             "Troubleshooting Options", "", "View System Logs", "", "View Support Information", "",
+    const char* entries[] = {"Configure Password",
+                             "Configure Lockdown Mode",
+                             "",
+                             "Configure Devices",
+                             "Configure Management Network",
+                             "Restart Management Network",
+                             "Test Management Network",
+                             "Network Restore Options",
+                             "",
+                             "Configure Keyboard",
+                             "Troubleshooting Options",
+                             "",
+                             "View System Logs",
+                             "",
+                             "View Support Information",
+                             "",
                              "Reset System Configuration"};
     const int count = sizeof entries / sizeof entries[0];
     int current = 0;

@@ -129,7 +129,8 @@ void WriteFile(const fs::path& path, const std::string& content, mode_t mode) {
         }
         done += size_t(n);
     }
-    if (fchmod(fd, mode) < 0 || close(fd) < 0) Fail(path.string() + ": cannot write: " + ErrnoText(errno));
+    if (fchmod(fd, mode) < 0 || fsync(fd) < 0 || close(fd) < 0)
+        Fail(path.string() + ": cannot write: " + ErrnoText(errno));
 }
 
 void MakeSymlink(const std::string& target, const fs::path& link) {
@@ -300,6 +301,31 @@ std::string ReadRootPassword(const std::string& root) {
     Fail(path + ": has no line for root");
 }
 
+void SetLoginSecret(const std::string& root, const std::string& user, const std::string& secret) {
+    if (!IsValidPassword(user)) Fail("bad user name \"" + user + "\"");
+    if (!IsValidPassword(secret)) Fail("bad secret: it may not be empty or hold ':' or line breaks");
+    const std::string path = PamPassdbPath(root);
+    std::ifstream in(path);
+    if (!in) Fail(path + ": cannot read: " + ErrnoText(errno));
+    std::string content, line;
+    bool replaced = false;
+    while (std::getline(in, line)) {
+        if (line.rfind(user + ":", 0) == 0) {
+            // Keep the service the line names; only the secret changes.
+            size_t end = line.find(':', user.size() + 1);
+            line = user + ":" + secret + (end == std::string::npos ? ":velk" : line.substr(end));
+            replaced = true;
+        }
+        content += line + "\n";
+    }
+    if (!replaced) content += user + ":" + secret + ":velk\n";
+    const fs::path temporary = path + ".new";
+    WriteFile(temporary, content, 0600);
+    std::error_code ec;
+    fs::rename(temporary, path, ec);
+    if (ec) Fail(path + ": cannot replace: " + ec.message());
+}
+
 bool IsValidPassword(const std::string& password) {
     return !password.empty() && password.find_first_of(":\r\n") == std::string::npos;
 }
@@ -352,7 +378,8 @@ std::string CreateHostRoot(const HostRootOptions& options) {
     WriteFile(root / "var/run/zolva/show-velk-login", "", 0644);
     // The support information pages a host installs with the console.
     fs::create_directories(root / "usr/share/velk");
-    fs::copy_file(VELK_SUPPORT_INFO, root / "usr/share/velk/support-info", fs::copy_options::overwrite_existing);
+    fs::copy_file(VELK_SUPPORT_INFO, root / "usr/share/velk/support-info",
+                  fs::copy_options::overwrite_existing);
 
     WriteFile(root / "bin/hrm-cmd", ToolScript(options.hostCommandBinary, root, "hrm-cmd"), 0755);
     WriteFile(root / "sbin/grabCIMData", ToolScript(options.hostCommandBinary, root, "grabCIMData"), 0755);

@@ -28,6 +28,12 @@ std::string PamPassdbPath(const std::string& root);
 // std::runtime_error when the file cannot be read or has no root line.
 std::string ReadRootPassword(const std::string& root);
 
+// Gives `user` the console secret `secret` (password or card PIN) in the
+// host's password file: the user's line is replaced, or added when missing.
+// The file is replaced as a whole (written beside it, then renamed), so a
+// console logging in at the same time reads either the old or the new file.
+void SetLoginSecret(const std::string& root, const std::string& user, const std::string& secret);
+
 // True for a password that the host's password file can hold: not empty, no
 // ':' and no line breaks.
 bool IsValidPassword(const std::string& password);

@@ -4,6 +4,8 @@
 //   velk-simhost get ROOT POINTER
 //   velk-simhost set ROOT POINTER VALUE
 //   velk-simhost remove ROOT POINTER
+//   velk-simhost card ROOT insert USER PIN [--slot N]
+//   velk-simhost card ROOT pull [--slot N]
 // POINTER is a JSON pointer into ROOT/host.json; VALUE is JSON, or else taken
 // as a string.
 #include <unistd.h>
@@ -27,7 +29,9 @@ const char* const USAGE =
     "       velk-simhost login ROOT\n"
     "       velk-simhost get ROOT POINTER\n"
     "       velk-simhost set ROOT POINTER VALUE\n"
-    "       velk-simhost remove ROOT POINTER\n";
+    "       velk-simhost remove ROOT POINTER\n"
+    "       velk-simhost card ROOT insert USER PIN [--slot N]\n"
+    "       velk-simhost card ROOT pull [--slot N]\n";
 
 int Usage(const std::string& problem) {
     if (!problem.empty()) std::fprintf(stderr, "velk-simhost: %s\n", problem.c_str());
@@ -124,6 +128,47 @@ int Edit(const std::string& command, const std::vector<std::string>& args) {
     return 0;
 }
 
+// Puts a smart card for USER into a reader slot (the first by default), with
+// PIN as the user's console secret, or pulls the card out of the slot. The
+// console notices either on its next refresh signal (SIGUSR1).
+int Card(const std::vector<std::string>& args) {
+    std::vector<std::string> words;
+    size_t slot = 0;
+    for (size_t i = 0; i < args.size(); ++i) {
+        if (args[i] == "--slot") {
+            if (i + 1 >= args.size()) return Usage("--slot needs a number");
+            const std::string& n = args[++i];
+            if (n.empty() || n.size() > 3 || n.find_first_not_of("0123456789") != std::string::npos)
+                return Usage("bad slot number " + n);
+            slot = std::stoul(n);
+        } else {
+            words.push_back(args[i]);
+        }
+    }
+    const bool insert = words.size() == 4 && words[1] == "insert";
+    if (!insert && !(words.size() == 2 && words[1] == "pull"))
+        return Usage("card takes ROOT insert USER PIN, or ROOT pull");
+    const std::string& root = words[0];
+    HostCtl::Lib::SimState sim(root);
+    std::shared_ptr<const json> state = sim.Read();
+    const std::string pointer = "/smartCards/slots/" + std::to_string(slot);
+    try {
+        (void)VelkTools::GetAt(*state, pointer);
+    } catch (const VelkTools::PointerError&) {
+        return Error("the host has no smart card slot " + std::to_string(slot));
+    }
+    if (!insert) {
+        sim.Update([&](json& latest) { VelkTools::SetAt(latest, pointer + "/token", nullptr); });
+        return 0;
+    }
+    const std::string& user = words[2];
+    // The secret first: a card the console sees can always be used.
+    VelkTools::SetLoginSecret(root, user, words[3]);
+    json token = {{"label", "Card of " + user}, {"userIds", {user}}};
+    sim.Update([&](json& latest) { VelkTools::SetAt(latest, pointer + "/token", token); });
+    return 0;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -139,6 +184,7 @@ int main(int argc, char** argv) {
         if (command == "create") return Create(args);
         if (command == "login") return Login(args);
         if (command == "get" || command == "set" || command == "remove") return Edit(command, args);
+        if (command == "card") return Card(args);
     } catch (const std::exception& e) {
         return Error(e.what());
     }

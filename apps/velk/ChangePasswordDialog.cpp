@@ -37,8 +37,7 @@ ChangePasswordDialog::ChangePasswordDialog(Frame* parent) : Dialog(parent, 60, 1
         _fields[i] = new InputItem(_factory->GetString(labels[i]), "");
         _fields[i]->SetMasked(true);
     }
-    _list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
-    _list->SetItems({_fields[OLD_FIELD], _fields[NEW_FIELD], _fields[CONFIRM_FIELD]});
+    _list = NewContentList({_fields[OLD_FIELD], _fields[NEW_FIELD], _fields[CONFIRM_FIELD]});
 }
 
 ChangePasswordDialog::~ChangePasswordDialog() {
@@ -124,6 +123,7 @@ ChangePasswordDialog::Outcome ChangePasswordDialog::Submit() {
     }
     WipeFields(OLD_FIELD);
     const std::string& user = Frame::_loginName;
+    Window::Flush();
     const int rc = PamChangePassword(user, s.oldSecret, s.newSecret);
     if (rc != PAM_SUCCESS) {
         // PAM modules refuse a wrong old password either way.

@@ -63,9 +63,11 @@ int RunShellCommand(const std::string& commandLine) {
     std::string line = commandLine;
     if (!line.empty() && line[0] == '/') {
         const size_t end = line.find_first_of(" \t");
-        line = HostCtl::Lib::HostPath(line.substr(0, end)) + (end == std::string::npos ? "" : line.substr(end));
+        line =
+            HostCtl::Lib::HostPath(line.substr(0, end)) + (end == std::string::npos ? "" : line.substr(end));
     }
-    const std::string path = "PATH=" + HostCtl::Lib::HostPath("/sbin") + ":" + HostCtl::Lib::HostPath("/bin") +
+    const std::string path = "PATH=" + HostCtl::Lib::HostPath("/sbin") + ":" +
+                             HostCtl::Lib::HostPath("/bin") +
                              (HostCtl::Lib::IsSimulatedHost() ? "" : ":/usr/sbin:/usr/bin");
     const char* const env[] = {"PYTHONHOME=/", path.c_str(), nullptr};
     const char* const argv[] = {"sh", "-c", line.c_str(), nullptr};
@@ -89,6 +91,8 @@ int Spawn(const char* path, const char* const argv[], const char* const env[], c
     }
     const std::string program = HostCtl::Lib::HostPath(path);
 
+    // The screen shows what the console waits for while the child runs.
+    Window::Flush();
     pid_t pid = fork();
     if (pid < 0) {
         ClosePair(errPipe);
@@ -169,8 +173,8 @@ int Spawn(const char* path, const char* const argv[], const char* const env[], c
 
 }  // namespace
 
-int InvokeHrmCmd(const char* path, const char* argv[], char* outBuf, size_t* outLen, char* errBuf, size_t* errLen,
-                 const char* inBuf, size_t inLen) {
+int InvokeHrmCmd(const char* path, const char* argv[], char* outBuf, size_t* outLen, char* errBuf,
+                 size_t* errLen, const char* inBuf, size_t inLen) {
     int result = RunCommand(path, argv, outBuf, outLen, errBuf, errLen, inBuf, inLen, 0);
     if (result != 255) return result;
     Syslog(LOG_INFO, "Unable to execute command hrm-cmd %s using user %s. Using user %s", argv[3], argv[2],
@@ -197,13 +201,13 @@ bool HrmGetFlag(const std::string& command) {
 }
 
 void PowerOffVms(bool keepRunning) {
-    const char* agentArgv[] = {"hrm-cmd", "-U", Frame::_loginName.c_str(), "hostsvc/autostartmanager/autostop",
-                               nullptr};
+    const char* agentArgv[] = {"hrm-cmd", "-U", Frame::_loginName.c_str(),
+                               "hostsvc/autostartmanager/autostop", nullptr};
     InvokeHrmCmd("/bin/hrm-cmd", agentArgv, nullptr, nullptr, nullptr, nullptr, nullptr, 0);
     const char* gentle[] = {"powerOffVms", nullptr};
     const char* forceful[] = {"powerOffVms", "--terminate", nullptr};
-    RunCommand("/bin/powerOffVms", keepRunning ? gentle : forceful, nullptr, nullptr, nullptr, nullptr, nullptr, 0,
-               0);
+    RunCommand("/bin/powerOffVms", keepRunning ? gentle : forceful, nullptr, nullptr, nullptr, nullptr,
+               nullptr, 0, 0);
 }
 
 int InitObzUser() {

@@ -26,8 +26,8 @@ int RunShellCommand(const std::string& commandLine);
 // Runs "/bin/hrm-cmd"-style argv ("hrm-cmd", "-U", user, command, ...); when
 // the tool answers 255 (it could not act as that user) it is run once more as
 // VELK_USER, with both capacities reset to 256.
-int InvokeHrmCmd(const char* path, const char* argv[], char* outBuf, size_t* outLen, char* errBuf, size_t* errLen,
-                 const char* inBuf, size_t inLen);
+int InvokeHrmCmd(const char* path, const char* argv[], char* outBuf, size_t* outLen, char* errBuf,
+                 size_t* errLen, const char* inBuf, size_t inLen);
 
 // Asks the host agent to re-read the host's state.
 void RefreshHostAgent();
@@ -42,6 +42,5 @@ void PowerOffVms(bool keepRunning);
 int InitObzUser();
 // Reports one observation event; format is printf-style.
 void ReportObzEvent(const char* format, ...) __attribute__((format(printf, 1, 2)));
-
 
 }  // namespace Velk

@@ -16,7 +16,8 @@ Dialog::Dialog(Frame* parent, int width, int height, int headerHeight)
     const int bodyWidth = _body->GetWidth();
     const int bodyHeight = _body->GetHeight();
     _footer = new TextArea(_body, 2, bodyHeight - 2, bodyWidth - 4, 1, BLACK);
-    _content = bodyHeight - 4 < 1 ? nullptr : NewChild(_body, 2, 1, bodyWidth - 4, bodyHeight - 4, YELLOW, DARK_GREY);
+    _content = bodyHeight - 4 < 1 ? nullptr
+                                  : NewChild(_body, 2, 1, bodyWidth - 4, bodyHeight - 4, YELLOW, DARK_GREY);
 }
 
 // The child windows and text areas belong to the window tree and are freed
@@ -31,5 +32,11 @@ void Dialog::Show(bool visible) {
 void Dialog::SetTitle(const std::string& text) { _title->SetText(text); }
 void Dialog::SetDescription(const std::string& text) { _description->SetText(text); }
 void Dialog::SetFooter(const std::string& text) { _footer->SetText(text); }
+
+ItemList* Dialog::NewContentList(const std::vector<Item*>& items) {
+    auto* list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
+    list->SetItems(items);
+    return list;
+}
 
 }  // namespace Velk

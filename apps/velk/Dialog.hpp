@@ -4,8 +4,11 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 #include "Frame.hpp"
+#include "Item.hpp"
+#include "ItemList.hpp"
 #include "TextArea.hpp"
 
 namespace Velk {
@@ -22,6 +25,16 @@ public:
     void SetFooter(const std::string& text);
 
 protected:
+    // Footer of a dialog whose list rows are marked with Space.
+    static constexpr const char* TOGGLE_LIST_FOOTER =
+        "{color:black}<Up/Down>{/color} {color:dark-grey}Select{/color}  {color:black}<Space>{/color} "
+        "{color:dark-grey}Toggle Selected{/color}{align:right}{color:black}<Enter>{/color} "
+        "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}";
+
+    // A list filling the content window, showing `items` (still owned by
+    // the caller); the caller deletes the list.
+    ItemList* NewContentList(const std::vector<Item*>& items);
+
     Window* _titleBand;
     Window* _body;
     Window* _content;  // null when the body is too small for one

@@ -2,7 +2,6 @@
 
 #include <syslog.h>
 
-#include <algorithm>
 #include <string>
 
 #include "MessageDialog.hpp"
@@ -16,8 +15,7 @@ DriverVMDialog::DriverVMDialog(Frame* parent) : Dialog(parent, 76, 20, 7) {
     _devices = QelCtl::Hardware::DriverVmInfoImpl().GetDevices();
     for (const auto& device : _devices)
         _items.push_back(new CheckItem(device.name + " (" + device.id + ")", device.owned));
-    _list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
-    _list->SetItems(std::vector<Item*>(_items.begin(), _items.end()));
+    _list = NewContentList(std::vector<Item*>(_items.begin(), _items.end()));
 }
 
 DriverVMDialog::~DriverVMDialog() {
@@ -28,18 +26,14 @@ DriverVMDialog::~DriverVMDialog() {
 void DriverVMDialog::Draw() {
     SetTitle(_factory->GetString(73));
     SetDescription(_factory->GetString(74));
-    SetFooter(
-        "{color:black}<Up/Down>{/color} {color:dark-grey}Select{/color}  {color:black}<Space>{/color} "
-        "{color:dark-grey}Toggle Selected{/color}{align:right}{color:black}<Enter>{/color} "
-        "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}");
+    SetFooter(TOGGLE_LIST_FOOTER);
     Refresh();
     _list->Draw();
 }
 
 void DriverVMDialog::ToggleCurrent() {
-    const auto it = std::find(_items.begin(), _items.end(), _list->GetCurrent());
-    if (it == _items.end()) return;
-    const size_t current = static_cast<size_t>(it - _items.begin());
+    if (_list->GetCurrentIndex() < 0) return;
+    const size_t current = static_cast<size_t>(_list->GetCurrentIndex());
     const bool owned = !_items[current]->IsChecked();
     const std::string& group = _devices[current].group;
 

@@ -146,6 +146,7 @@ int Frame::WaitForInput(struct timeval* timeout) {
     FD_ZERO(&fds);
     FD_SET(0, &fds);
     FD_SET(_signalPipe[0], &fds);
+    Window::Flush();
     int n = select(std::max(0, _signalPipe[0]) + 1, &fds, nullptr, nullptr, timeout);
     if (n < 0) {
         LogError("select() failed");
@@ -270,7 +271,8 @@ bool Frame::IsSmartCardPresent(const std::string& userId) {
         for (const auto& slot : _cardInfo.GetAllSlots()) {
             QelCtl::Hardware::SmartCardToken token;
             if (!_cardInfo.GetToken(slot, token)) continue;
-            if (std::find(token.userIds.begin(), token.userIds.end(), userId) != token.userIds.end()) return true;
+            if (std::find(token.userIds.begin(), token.userIds.end(), userId) != token.userIds.end())
+                return true;
         }
     } catch (const HostCtl::Lib::HostCtlException&) {
         Syslog(LOG_ERR, "Error trying to lookup smart card tokens.");
@@ -281,7 +283,8 @@ bool Frame::IsSmartCardPresent(const std::string& userId) {
 void Frame::CheckSmartCard() {
     if (!_loggedIn) {
         _smartCardLoginId = GetSmartCardUserId();
-        if (!_smartCardLoginId.empty()) Syslog(LOG_INFO, "Found smart card with user id '%s'", _smartCardLoginId.c_str());
+        if (!_smartCardLoginId.empty())
+            Syslog(LOG_INFO, "Found smart card with user id '%s'", _smartCardLoginId.c_str());
     } else if (_isLoggedWithSmartCard && !IsSmartCardPresent(_loginName)) {
         Syslog(LOG_INFO, "Logging out user id '%s'", _loginName.c_str());
         exit(0);

@@ -42,7 +42,14 @@ public:
     static void CheckSmartCard();
 
     // Event codes of WaitForInput.
-    enum Event { EV_ERROR = -1, EV_TIMEOUT = -2, EV_REFRESH = -3, EV_RESTART = -4, EV_RESIZE = -5, EV_TERMINATE = -6 };
+    enum Event {
+        EV_ERROR = -1,
+        EV_TIMEOUT = -2,
+        EV_REFRESH = -3,
+        EV_RESTART = -4,
+        EV_RESIZE = -5,
+        EV_TERMINATE = -6
+    };
 
     static Frame* fgFrame;
     static sigset_t _signalSet;

@@ -193,6 +193,7 @@ std::string GeneralWindow::ManagementNetworkDescription() {
 
 void GeneralWindow::DrawContents() {
     SetLeftTitle(_factory->GetString(4));
+    SetLeftFooter("{color:black}<Up/Down>{/color}{color:dark-grey} Select{/color}");
     _menu->Draw();
     Update();
 }
@@ -200,9 +201,6 @@ void GeneralWindow::DrawContents() {
 void GeneralWindow::Update() {
     const int id = SelectedId();
     if (id < 0) return;
-    // The menu's last row shares the footer's line: every redraw of the menu
-    // blanks it, so the footer is written again after each one.
-    SetLeftFooter("{color:black}<Up/Down>{/color}{color:dark-grey} Select{/color}");
     SetRightTitle(_factory->GetString(id));
     std::string description;
     std::string footer;

@@ -2,6 +2,7 @@
 
 #include <syslog.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 
@@ -106,6 +107,11 @@ void ItemList::Up() {
     }
 }
 
+int ItemList::GetCurrentIndex() const {
+    const auto it = std::find(_items.begin(), _items.end(), GetCurrent());
+    return it == _items.end() ? -1 : static_cast<int>(it - _items.begin());
+}
+
 Item* ItemList::GetCurrent() const {
     if (_pos < 0) return nullptr;
     const size_t index = static_cast<size_t>(_top + _pos);
@@ -136,7 +142,7 @@ void ItemList::Draw() {
     // that stays.
     if (Item* current = GetCurrent(); current && _pos < rows)
         current->Draw(_itemAreas[static_cast<size_t>(_pos)]);
-    refresh();
+    wnoutrefresh(stdscr);
 }
 
 void ItemList::DrawScrollBar() {

@@ -32,6 +32,9 @@ public:
 
     // The current item, or null when the list has no selectable item.
     Item* GetCurrent() const;
+    // The current item's index in the list given to SetItems, -1 when the
+    // list has no selectable item.
+    int GetCurrentIndex() const;
     // The current item's number among the selectable items.
     int GetCurrentNumber() const { return _number; }
     // Index of the first item shown.

@@ -2,8 +2,6 @@
 
 #include <syslog.h>
 
-#include <algorithm>
-
 #include "StringFactory.hpp"
 #include "hostctl/Host.hpp"
 
@@ -20,8 +18,7 @@ KeyboardDialog::KeyboardDialog(Frame* parent) : Dialog(parent, 76, 18, 6) {
         _items.push_back(new RadioItem(_layouts[i], marked));
         if (marked) _checkedIndex = i;
     }
-    _list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
-    _list->SetItems(std::vector<Item*>(_items.begin(), _items.end()));
+    _list = NewContentList(std::vector<Item*>(_items.begin(), _items.end()));
 }
 
 KeyboardDialog::~KeyboardDialog() {
@@ -33,19 +30,16 @@ int KeyboardDialog::Run() {
     SetTitle(_factory->GetString(16));
     SetDescription(_factory->GetString(255));
     _list->Draw();
-    SetFooter(
-        "{color:black}<Up/Down>{/color} {color:dark-grey}Select{/color}  {color:black}<Space>{/color} "
-        "{color:dark-grey}Toggle Selected{/color}{align:right}{color:black}<Enter>{/color} "
-        "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}");
+    SetFooter(TOGGLE_LIST_FOOTER);
     Refresh();
     for (;;) {
         const int key = GetKey(true);
         switch (key) {
             case ' ': {
-                const auto it = std::find(_items.begin(), _items.end(), _list->GetCurrent());
-                if (it == _items.end()) break;
+                const int current = _list->GetCurrentIndex();
+                if (current < 0) break;
                 _items[_checkedIndex]->SetSelected(false);
-                _checkedIndex = static_cast<size_t>(it - _items.begin());
+                _checkedIndex = static_cast<size_t>(current);
                 _items[_checkedIndex]->SetSelected(true);
                 _list->Draw();
                 break;

@@ -3,10 +3,10 @@
 #include <security/pam_appl.h>
 #include <syslog.h>
 
+#include "CommandRunner.hpp"
 #include "Console.hpp"
 #include "KeyboardDialog.hpp"
 #include "MessageDialog.hpp"
-#include "CommandRunner.hpp"
 #include "Pam.hpp"
 #include "StringFactory.hpp"
 #include "hostctl/Host.hpp"
@@ -36,8 +36,10 @@ LoginDialog::LoginDialog(Frame* parent) : Dialog(parent, 60, 14, 7) {
     _secret->SetMasked(true);
     _items.push_back(_name);
     _items.push_back(_secret);
-    _list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
-    // A card already in its reader offers PIN login at once.
+    _list = NewContentList(_items);
+    // A card already in its reader offers PIN login at once, even when no
+    // refresh signal has told the console about it yet.
+    CheckSmartCard();
     SetMode(!_smartCardLoginId.empty());
 }
 
@@ -122,6 +124,7 @@ void LoginDialog::Submit() {
     std::string secret = _secret->GetText();
     // The field's copy is gone as soon as PAM has the secret.
     _secret->WipeText();
+    Window::Flush();
     const int rc = PamLogin(loginName, secret);
     WipeSecret(secret);
     const char* user = loginName.c_str();

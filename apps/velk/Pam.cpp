@@ -41,8 +41,8 @@ int Converse(int count, const pam_message** messages, pam_response** out, void* 
     for (int i = 0; i < count; ++i) {
         const int style = messages[i]->msg_style;
         if (style != PAM_PROMPT_ECHO_OFF && style != PAM_PROMPT_ECHO_ON) continue;
-        const std::string& secret = answers.oldSecret && AsksForOldSecret(messages[i]->msg) ? *answers.oldSecret
-                                                                                             : *answers.newSecret;
+        const std::string& secret =
+            answers.oldSecret && AsksForOldSecret(messages[i]->msg) ? *answers.oldSecret : *answers.newSecret;
         responses[i].resp = strdup(secret.c_str());
         if (!responses[i].resp) {
             FreeResponses(responses, count);

@@ -7,7 +7,10 @@ namespace Velk {
 
 PowerProgressDialog::PowerProgressDialog(Frame* parent, bool keepRunningVms, int titleId, int headerId,
                                          const char* command)
-    : Dialog(parent, 70, 10, 7), keepRunningVms(keepRunningVms), _titleId(titleId), _headerId(headerId),
+    : Dialog(parent, 70, 10, 7),
+      keepRunningVms(keepRunningVms),
+      _titleId(titleId),
+      _headerId(headerId),
       _command(command) {}
 
 int PowerProgressDialog::Run() {

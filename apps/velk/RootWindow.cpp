@@ -22,7 +22,9 @@ RootWindow::RootWindow(Frame* parent)
     _leftPane = NewChild(_main, 0, 0, half, LINES - 1, YELLOW, WHITE);
     _rightPane = NewChild(_main, half, 0, half, LINES - 1, DARK_GREY, WHITE);
     HostCtl::Lib::Syslog(LOG_INFO, "COLS=%d, LINES=%d", COLS, LINES);
-    _menu = new ItemList(_leftPane, 2, 4, half - 2, LINES - 6);
+    // The menu ends one row above the left footer, so that a long menu
+    // scrolls instead of running under the footer's key hints.
+    _menu = new ItemList(_leftPane, 2, 4, half - 2, LINES - 7);
     _description = new TextArea(_rightPane, 2, 4, half - 4, LINES - 6, LIGHT_GREY);
     _leftTitle = new TextArea(_leftPane, 3, 1, half - 6, 1, BLACK);
     _rightTitle = new TextArea(_rightPane, 2, 1, half - 6, 1, WHITE);

@@ -12,8 +12,7 @@ namespace Velk {
 
 ShutdownDialog::ShutdownDialog(Frame* parent) : Dialog(parent, 60, 19, 13) {
     _force = new CheckItem(_factory->GetString(170), false, 0);
-    _list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
-    _list->SetItems({_force});
+    _list = NewContentList({_force});
 }
 
 ShutdownDialog::~ShutdownDialog() {

@@ -67,7 +67,10 @@ std::string FormatMemorySize(uint64_t bytes) {
     const uint64_t whole = value / unit;
     const uint64_t rest = value % unit;
     std::string text = std::to_string(whole);
-    if (rest != 0) text += "." + std::to_string(static_cast<unsigned>((static_cast<unsigned __int128>(rest) * 10) / unit));
+    if (rest != 0) {
+        text += '.';
+        text += std::to_string(static_cast<unsigned>((static_cast<unsigned __int128>(rest) * 10) / unit));
+    }
     return text + " " + kUnits[index];
 }
 
@@ -161,11 +164,19 @@ std::string TextArea::GetSSLThumbprintValue() {
     return fingerprint;
 }
 
-std::string TextArea::GetSSHRsaKeyFingerprintValue() { return GetSshKeyFingerprint("/etc/ssh/ssh_host_rsa_key"); }
-std::string TextArea::GetSSHDsaKeyFingerprintValue() { return GetSshKeyFingerprint("/etc/ssh/ssh_host_dsa_key"); }
-std::string TextArea::GetBIOSVersion() { return GetCimProperty("OMC_SMASHFirmwareIdentity", "VersionString"); }
+std::string TextArea::GetSSHRsaKeyFingerprintValue() {
+    return GetSshKeyFingerprint("/etc/ssh/ssh_host_rsa_key");
+}
+std::string TextArea::GetSSHDsaKeyFingerprintValue() {
+    return GetSshKeyFingerprint("/etc/ssh/ssh_host_dsa_key");
+}
+std::string TextArea::GetBIOSVersion() {
+    return GetCimProperty("OMC_SMASHFirmwareIdentity", "VersionString");
+}
 std::string TextArea::GetBMCVersion() { return GetCimProperty("OMC_MCFirmwareIdentity", "VersionString"); }
-std::string TextArea::GetPLSAVersion() { return GetCimProperty("Zolva_HHRCWrapperSoftwareIdentity", "VersionString"); }
+std::string TextArea::GetPLSAVersion() {
+    return GetCimProperty("Zolva_HHRCWrapperSoftwareIdentity", "VersionString");
+}
 std::string TextArea::GetAssetTag() { return GetCimProperty("CIM_Chassis", "OtherIdentifyingInfo"); }
 std::string TextArea::GetCPLDVersion() { return "N/A"; }
 

@@ -365,7 +365,7 @@ void TextArea::Draw() {
     // the screen placed it (an input field being edited).
     if (_cursor) {
         move(_yCursor, _xCursor);
-        refresh();
+        wnoutrefresh(stdscr);
     }
 }
 

@@ -27,7 +27,8 @@ namespace {
 
 const char kLoginMarker[] = "/var/run/zolva/show-velk-login";
 const char kNoAdapterText[] =
-    "No compatible network adapter found. Please consult the product's Hardware Compatibility Guide (HCG) for a "
+    "No compatible network adapter found. Please consult the product's Hardware Compatibility Guide (HCG) "
+    "for a "
     "list of supported adapters.";
 const char kNoAdapterAlert[] = "No compatible network adapter found.";
 
@@ -65,7 +66,8 @@ bool FileExists(const char* hostPath) {
 
 }  // namespace
 
-WelcomeWindow::WelcomeWindow() : Frame(nullptr, 0, 0, COLS, LINES, BLACK, WHITE), _dnsConfig("defaultTcpipStack") {}
+WelcomeWindow::WelcomeWindow()
+    : Frame(nullptr, 0, 0, COLS, LINES, BLACK, WHITE), _dnsConfig("defaultTcpipStack") {}
 
 // Sub-windows and text areas belong to the window tree.
 WelcomeWindow::~WelcomeWindow() = default;
@@ -187,7 +189,8 @@ void WelcomeWindow::Fill() {
             network += std::string("\n") + _factory->GetString(264);
             warning = _factory->GetString(142);
         } else {
-            network += "\nhttp://" + address.GetStringAddress() + "/ (" + _factory->GetString(dhcp ? 261 : 262) + ")";
+            network += "\nhttp://" + address.GetStringAddress() + "/ (" +
+                       _factory->GetString(dhcp ? 261 : 262) + ")";
         }
     }
     if (ipv6Enabled && !ipv6.empty()) network += "\n" + Ipv6Lines(ipv6, *_factory);
@@ -210,7 +213,8 @@ void WelcomeWindow::Fill() {
         hardware = CombineVendorAndProduct(hardwareInfo.GetVendorName(), hardwareInfo.GetProductName());
         QelCtl::Hardware::CpuInfoImpl cpu;
         const unsigned packages = cpu.GetNumCpuPackages();
-        processors = packages >= 2 ? std::to_string(packages) + " x " + cpu.GetModelName() : cpu.GetModelName();
+        processors =
+            packages >= 2 ? std::to_string(packages) + " x " + cpu.GetModelName() : cpu.GetModelName();
         processors += "\n" + FormatMemorySize(GetTotalMemoryBytes()) + "iB Memory";
     } catch (const HostCtl::Lib::HostCtlException& e) {
         Syslog(LOG_ERR, "Unable to read the hardware information: %s", e.what());

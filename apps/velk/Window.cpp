@@ -94,7 +94,13 @@ void Window::SetCursor(bool on) {
 void Window::Refresh() {
     if (!_win) return;
     wtouchln(_win, 0, _height, 1);
-    wrefresh(_win);
+    wnoutrefresh(_win);
+}
+
+void Window::Flush() {
+    // Nothing to write before curses starts or while the terminal is handed
+    // to another program.
+    if (stdscr != nullptr && !isendwin()) doupdate();
 }
 
 void Window::Redraw() {

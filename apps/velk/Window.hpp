@@ -30,7 +30,14 @@ public:
     void Print(int x, int y, const std::string& text);
     void MoveCursor(int x, int y);
     static void SetCursor(bool on);
+    // Copies the window to the next screen update. The terminal is written
+    // once per update, at Flush, so a key that redraws several windows sends
+    // only the cells that end up different (a serial line pays per byte).
     void Refresh();
+    // Writes pending changes to the terminal. Reading a key does it, and so
+    // does starting a child program; call it before any other slow step, so
+    // that the screen shows what the console is waiting for.
+    static void Flush();
     void Redraw();
     void Erase();
     void Box();

@@ -74,7 +74,7 @@ TEST_P(PidFileTest, OwnedOnlyByALiveInstance) {
     }
     // A second instance is not refused: it runs on.
     EXPECT_FALSE(t.HasExited());
-    EXPECT_TRUE(t.Contains("Download tools to manage this host from:"));
+    EXPECT_TRUE(t.Shows("Download tools to manage this host from:"));
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -201,7 +201,7 @@ TEST(EndTest, RefreshSignalDoesNotEnd) {
     for (int i = 0; i < 3; ++i) t.Signal(SIGUSR1);
     ASSERT_TRUE(t.WaitQuiet(Duration(300)));
     EXPECT_FALSE(t.HasExited());
-    EXPECT_TRUE(t.Contains("Shut Down/Restart")) << t.Dump();
+    EXPECT_TRUE(t.Shows("Shut Down/Restart"));
     t.Signal(SIGTERM);
     EXPECT_TRUE(t.ExitsWith(0));
 }

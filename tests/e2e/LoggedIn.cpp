@@ -1,5 +1,6 @@
 #include "LoggedIn.hpp"
 
+#include <algorithm>
 #include <cstdlib>
 #include <thread>
 
@@ -89,16 +90,8 @@ TerminalOptions PamConsole(const SimHost& host, const std::string& term, int col
 
 std::vector<nlohmann::json> History(const SimHost& host, const std::vector<std::string>& tools) {
     std::vector<nlohmann::json> found;
-    const nlohmann::json history = host.Get("/history");
-    for (const auto& entry : history) {
-        const std::string tool = entry.value("tool", "");
-        for (const auto& wanted : tools) {
-            if (tool == wanted) {
-                found.push_back(entry);
-                break;
-            }
-        }
-    }
+    for (const auto& entry : host.Get("/history"))
+        if (std::ranges::find(tools, entry.value("tool", "")) != tools.end()) found.push_back(entry);
     return found;
 }
 
@@ -114,10 +107,41 @@ std::vector<nlohmann::json> History(const SimHost& host, const std::vector<std::
                                          << Joined(host.SyslogLines());
 }
 
+::testing::AssertionResult LoggedOnce(const SimHost& host, const std::string& text, pid_t pid) {
+    const size_t count = host.ConsoleLog(text, pid).size();
+    if (count == 1) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure()
+           << count << " log lines of [" << pid << "] with \"" << text << "\":\n"
+           << Joined(host.SyslogLines());
+}
+
+::testing::AssertionResult NotLogged(const SimHost& host, const std::string& text) {
+    if (host.ConsoleLog(text).empty()) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure() << "a log line with \"" << text << "\":\n"
+                                         << Joined(host.SyslogLines());
+}
+
 std::string Joined(const std::vector<std::string>& lines) {
     std::string all;
     for (const auto& l : lines) all += l + "\n";
     return all;
+}
+
+::testing::AssertionResult ConsoleTest::Start(const std::string& term) {
+    t.emplace(PamConsole(host, term));
+    return WaitForWelcome(*t);
+}
+
+::testing::AssertionResult ConsoleTest::StartInMenu(const std::string& term) {
+    if (auto started = Start(term); !started) return started;
+    return LogInToMenu(*t);
+}
+
+::testing::AssertionResult ConsoleTest::OpenEntry(const std::string& entry, const std::string& shown) {
+    if (auto menu = StartInMenu(); !menu) return menu;
+    if (auto selected = SelectEntry(*t, entry); !selected) return selected;
+    t->SendKey("Enter");
+    return t->WaitForText(shown);
 }
 
 }  // namespace E2e

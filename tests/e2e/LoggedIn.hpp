@@ -4,6 +4,7 @@
 #pragma once
 
 #include <nlohmann/json.hpp>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -53,6 +54,33 @@ std::vector<nlohmann::json> History(const SimHost& host, const std::vector<std::
 ::testing::AssertionResult WaitForLog(const SimHost& host, const std::string& text,
                                       Duration timeout = kDefaultTimeout);
 
+// Exactly one line of the console with `pid` contains `text`; the failure
+// shows the log.
+::testing::AssertionResult LoggedOnce(const SimHost& host, const std::string& text, pid_t pid);
+// No line of the host's log, whoever wrote it, contains `text`.
+::testing::AssertionResult NotLogged(const SimHost& host, const std::string& text);
+
 std::string Joined(const std::vector<std::string>& lines);
+
+// A case on a fresh host where root has kRootPassword. `t` is the console
+// once one of the Start functions ran; a case that needs another host changes
+// it before that.
+class ConsoleTest : public ::testing::Test {
+protected:
+    ConsoleTest() { SetRootPassword(host); }
+
+    // Starts the console and waits for the welcome screen.
+    ::testing::AssertionResult Start(const std::string& term = "linux");
+    // Start, then logs root in and waits for the main menu.
+    ::testing::AssertionResult StartInMenu(const std::string& term = "linux");
+    // StartInMenu, then selects `entry`, presses Enter and waits for `shown`.
+    ::testing::AssertionResult OpenEntry(const std::string& entry, const std::string& shown);
+
+    SimHost host;
+    std::optional<Terminal> t;
+};
+
+template <typename Param>
+class ConsoleTestWithParam : public ConsoleTest, public ::testing::WithParamInterface<Param> {};
 
 }  // namespace E2e

@@ -41,31 +41,34 @@ struct PowerCase {
 };
 void PrintTo(const PowerCase& c, std::ostream* os) { *os << c.name; }
 
-class PowerTest : public ::testing::TestWithParam<PowerCase> {};
+class PowerTest : public ConsoleTestWithParam<PowerCase> {
+protected:
+    // Logs in with F12 and waits for the shut-down dialog.
+    ::testing::AssertionResult OpenShutdownDialog() {
+        if (auto started = Start(); !started) return started;
+        if (auto submitted = SubmitLogin(*t, kRootPassword, "", "F12"); !submitted) return submitted;
+        return t->WaitForText("Forcefully terminate running VMs");
+    }
+};
 
 TEST_P(PowerTest, StopsVmsThenPowersTheHost) {
     const PowerCase& c = GetParam();
-    SimHost host;
-    SetRootPassword(host);
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(SubmitLogin(t, kRootPassword, "", "F12"));
-    ASSERT_TRUE(t.WaitForText("Forcefully terminate running VMs")) << t.Dump();
-    EXPECT_TRUE(t.Contains("Remote management software is recommended")) << t.Dump();
-    EXPECT_FALSE(t.Contains("System Customization")) << t.Dump();
+    ASSERT_TRUE(OpenShutdownDialog());
+    EXPECT_TRUE(t->Shows("Remote management software is recommended"));
+    EXPECT_TRUE(t->Lacks("System Customization"));
 
     // Keys the dialog does not know change nothing.
-    t.SendKey("Enter");
-    t.SendKey("F3");
-    ASSERT_TRUE(t.WaitQuiet());
-    EXPECT_TRUE(t.Contains("Forcefully terminate running VMs")) << t.Dump();
+    t->SendKey("Enter");
+    t->SendKey("F3");
+    ASSERT_TRUE(t->WaitQuiet());
+    EXPECT_TRUE(t->Shows("Forcefully terminate running VMs"));
     if (c.terminate) {
         // Twice is clear again, three times set.
-        for (int i = 0; i < 3; ++i) t.Send(" ");
-        ASSERT_TRUE(t.WaitQuiet());
+        for (int i = 0; i < 3; ++i) t->Send(" ");
+        ASSERT_TRUE(t->WaitQuiet());
     }
-    t.SendKey(c.key);
-    ASSERT_TRUE(t.WaitForText(c.progressTitle)) << t.Dump();
+    t->SendKey(c.key);
+    ASSERT_TRUE(t->WaitForText(c.progressTitle));
     ASSERT_TRUE(WaitForHistory(host, c.tool));
 
     const std::vector<json> power = PowerHistory(host);
@@ -78,15 +81,14 @@ TEST_P(PowerTest, StopsVmsThenPowersTheHost) {
     EXPECT_LT(power[1]["seq"], power[2]["seq"]);
 
     // Once, at informational level (the observation event repeats the text).
-    EXPECT_EQ(host.ConsoleLog(std::string("user.info: ") + c.logLine, t.Pid()).size(), 1u)
-        << Joined(host.SyslogLines());
+    EXPECT_TRUE(LoggedOnce(host, std::string("user.info: ") + c.logLine, t->Pid()));
 
     // The progress screen stays whatever is pressed.
-    EXPECT_TRUE(t.Contains(c.progressText)) << t.Dump();
-    for (const char* key : {"Esc", "Enter", "F2"}) t.SendKey(key);
-    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
-    EXPECT_TRUE(t.Contains(c.progressTitle)) << t.Dump();
-    EXPECT_FALSE(t.HasExited());
+    EXPECT_TRUE(t->Shows(c.progressText));
+    for (const char* key : {"Esc", "Enter", "F2"}) t->SendKey(key);
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t->Shows(c.progressTitle));
+    EXPECT_FALSE(t->HasExited());
     EXPECT_EQ(PowerHistory(host).size(), 3u) << host.Get("/history").dump(1);
 }
 
@@ -102,51 +104,45 @@ const PowerCase kPowerCases[] = {
 INSTANTIATE_TEST_SUITE_P(Keys, PowerTest, ::testing::ValuesIn(kPowerCases),
                          [](const auto& info) { return std::string(info.param.name); });
 
-TEST(PowerTest, EscLeavesTheShutdownDialogLoggedOut) {
-    SimHost host;
-    SetRootPassword(host);
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(SubmitLogin(t, kRootPassword, "", "F12"));
-    ASSERT_TRUE(t.WaitForText("Forcefully terminate running VMs")) << t.Dump();
-    t.SendKey("Esc");
-    ASSERT_TRUE(t.WaitForTextGone("Forcefully terminate running VMs")) << t.Dump();
-    EXPECT_TRUE(t.Contains("Customize System/View Logs")) << t.Dump();
+TEST_F(PowerTest, EscLeavesTheShutdownDialogLoggedOut) {
+    ASSERT_TRUE(OpenShutdownDialog());
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitForTextGone("Forcefully terminate running VMs"));
+    EXPECT_TRUE(t->Shows("Customize System/View Logs"));
     EXPECT_TRUE(PowerHistory(host).empty()) << host.Get("/history").dump(1);
-    EXPECT_EQ(host.ConsoleLog("User root logged out.", t.Pid()).size(), 1u) << Joined(host.SyslogLines());
+    EXPECT_TRUE(LoggedOnce(host, "User root logged out.", t->Pid()));
 }
 
-TEST(ResetTest, F11ResetsThenEnterRestarts) {
-    SimHost host;
-    SetRootPassword(host);
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
-    ASSERT_TRUE(SelectEntry(t, "Reset System Configuration"));
-    t.SendKey("Enter");
-    ASSERT_TRUE(t.WaitForText("Reset System Configuration now?")) << t.Dump();
-    EXPECT_TRUE(t.Contains("Reset System Configuration: Confirm")) << t.Dump();
+using ResetTest = ConsoleTest;
+using LogViewerTest = ConsoleTest;
+using KeyboardTest = ConsoleTest;
+using PasswordTest = ConsoleTest;
+using IdleTimeoutTest = ConsoleTest;
+
+TEST_F(ResetTest, F11ResetsThenEnterRestarts) {
+    ASSERT_TRUE(OpenEntry("Reset System Configuration", "Reset System Configuration now?"));
+    EXPECT_TRUE(t->Shows("Reset System Configuration: Confirm"));
 
     // Enter is not the confirming key.
-    t.SendKey("Enter");
-    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
-    EXPECT_TRUE(t.Contains("Reset System Configuration now?")) << t.Dump();
+    t->SendKey("Enter");
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t->Shows("Reset System Configuration now?"));
     EXPECT_TRUE(PowerHistory(host).empty()) << host.Get("/history").dump(1);
 
-    t.SendKey("F11");
-    ASSERT_TRUE(t.WaitForText("Default settings are restored. Press <Enter> to")) << t.Dump();
-    EXPECT_TRUE(t.Contains("restart your host.")) << t.Dump();
+    t->SendKey("F11");
+    ASSERT_TRUE(t->WaitForText("Default settings are restored. Press <Enter> to"));
+    EXPECT_TRUE(t->Shows("restart your host."));
     ASSERT_TRUE(WaitForHistory(host, "firmwareConfig.sh"));
     EXPECT_TRUE(WaitForLog(host, "user.info: Restoring factory defaults"));
 
     // No way back once the reset has run.
-    t.SendKey("Esc");
-    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
-    EXPECT_TRUE(t.Contains("Default settings are restored.")) << t.Dump();
-    EXPECT_TRUE(t.Contains("<Enter> Restart Host")) << t.Dump();
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t->Shows("Default settings are restored."));
+    EXPECT_TRUE(t->Shows("<Enter> Restart Host"));
     EXPECT_EQ(Tools(PowerHistory(host)), std::vector<std::string>{"firmwareConfig.sh"});
 
-    t.SendKey("Enter");
+    t->SendKey("Enter");
     ASSERT_TRUE(WaitForHistory(host, "reboot"));
     const std::vector<json> power = PowerHistory(host);
     ASSERT_EQ(Tools(power), (std::vector<std::string>{"firmwareConfig.sh", "reboot"})) << json(power).dump(1);
@@ -154,117 +150,88 @@ TEST(ResetTest, F11ResetsThenEnterRestarts) {
     EXPECT_EQ(power[1]["args"], json{"-f"});
 }
 
-TEST(LogViewerTest, DigitOpensTheLogInThePagerAndQReturns) {
-    SimHost host;
-    SetRootPassword(host);
+TEST_F(LogViewerTest, DigitOpensTheLogInThePagerAndQReturns) {
     const std::string marker = "e2e-marker-line for the pager";
     host.WriteFile("/var/log/syslog.log", host.ReadFile("/var/log/syslog.log") +
                                               "2024-01-01T00:00:00Z e2e[1]: user.info: " + marker + "\n");
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
-    ASSERT_TRUE(SelectEntry(t, "View System Logs"));
-    ASSERT_TRUE(t.WaitForText("<1> Syslog")) << t.Dump();
-    EXPECT_TRUE(t.Contains("<7> Zolva Tarni Observation log")) << t.Dump();
+    ASSERT_TRUE(StartInMenu());
+    ASSERT_TRUE(SelectEntry(*t, "View System Logs"));
+    ASSERT_TRUE(t->WaitForText("<1> Syslog"));
+    EXPECT_TRUE(t->Shows("<7> Zolva Tarni Observation log"));
 
-    t.Send("1");
-    ASSERT_TRUE(t.WaitForText(marker)) << t.Dump();
-    EXPECT_TRUE(t.Contains("<Q> Quit </> RegExp Search <H> Help")) << t.Dump();
-    EXPECT_FALSE(t.Contains("System Customization")) << t.Dump();
+    t->Send("1");
+    ASSERT_TRUE(t->WaitForText(marker));
+    EXPECT_TRUE(t->Shows("<Q> Quit </> RegExp Search <H> Help"));
+    EXPECT_TRUE(t->Lacks("System Customization"));
 
-    t.Send("q");
-    ASSERT_TRUE(WaitForMenu(t)) << t.Dump();
-    EXPECT_TRUE(t.Contains("<1> Syslog")) << t.Dump();
-    EXPECT_FALSE(t.Contains(marker)) << t.Dump();
+    t->Send("q");
+    ASSERT_TRUE(WaitForMenu(*t));
+    EXPECT_TRUE(t->Shows("<1> Syslog"));
+    EXPECT_TRUE(t->Lacks(marker));
     // The console reads keys again.
-    t.SendKey("Esc");
-    EXPECT_TRUE(WaitForWelcome(t)) << t.Dump();
+    t->SendKey("Esc");
+    EXPECT_TRUE(WaitForWelcome(*t));
 }
 
-TEST(KeyboardTest, SpaceMarksEnterApplies) {
-    SimHost host;
-    SetRootPassword(host);
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
-    ASSERT_TRUE(SelectEntry(t, "Configure Keyboard"));
-    t.SendKey("Enter");
-    ASSERT_TRUE(t.WaitForText("If you are having difficulty using your keyboard")) << t.Dump();
+const char kKeyboardHelp[] = "If you are having difficulty using your keyboard";
 
+TEST_F(KeyboardTest, SpaceMarksEnterApplies) {
+    ASSERT_TRUE(OpenEntry("Configure Keyboard", kKeyboardHelp));
     // The list starts at the current layout's place or at the top: move to
     // the first entry, then two down ("Brazilian" -> "Croatian").
-    for (int i = 0; i < 40; ++i) t.SendKey("Up");
-    t.SendKey("Down");
-    t.SendKey("Down");
-    t.Send(" ");
-    t.SendKey("Enter");
-    ASSERT_TRUE(WaitForMenu(t)) << t.Dump();
+    for (int i = 0; i < 40; ++i) t->SendKey("Up");
+    t->SendKey("Down");
+    t->SendKey("Down");
+    t->Send(" ");
+    t->SendKey("Enter");
+    ASSERT_TRUE(WaitForMenu(*t));
     ASSERT_TRUE(WaitForLog(host, "user.info: Keyboard Layout changed to Croatian"));
     EXPECT_EQ(host.Get("/system/keyboardLayout"), "Croatian");
     EXPECT_EQ(host.Get("/system/loadedKeymap"), "Croatian");
 }
 
-TEST(KeyboardTest, EscChangesNothing) {
-    SimHost host;
-    SetRootPassword(host);
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
-    ASSERT_TRUE(SelectEntry(t, "Configure Keyboard"));
-    t.SendKey("Enter");
-    ASSERT_TRUE(t.WaitForText("If you are having difficulty using your keyboard")) << t.Dump();
-    t.SendKey("Down");
-    t.Send(" ");
-    t.SendKey("Esc");
-    ASSERT_TRUE(t.WaitForTextGone("If you are having difficulty using your keyboard")) << t.Dump();
-    EXPECT_TRUE(t.Contains("System Customization")) << t.Dump();
+TEST_F(KeyboardTest, EscChangesNothing) {
+    ASSERT_TRUE(OpenEntry("Configure Keyboard", kKeyboardHelp));
+    t->SendKey("Down");
+    t->Send(" ");
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitForTextGone(kKeyboardHelp));
+    EXPECT_TRUE(t->Shows("System Customization"));
     EXPECT_EQ(host.Get("/system/keyboardLayout"), "US Default");
-    EXPECT_TRUE(host.ConsoleLog("Keyboard Layout changed").empty()) << Joined(host.SyslogLines());
+    EXPECT_TRUE(NotLogged(host, "Keyboard Layout changed"));
 }
 
-TEST(PasswordTest, NewPasswordWorksOldOneNoLonger) {
-    SimHost host;
-    SetRootPassword(host);
+TEST_F(PasswordTest, NewPasswordWorksOldOneNoLonger) {
     const std::string fresh = "Fresh-pass-42";
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
-    ASSERT_TRUE(SelectEntry(t, "Configure Password"));
-    t.SendKey("Enter");
-    ASSERT_TRUE(t.WaitForText("Old Password:")) << t.Dump();
+    ASSERT_TRUE(OpenEntry("Configure Password", "Old Password:"));
     for (const std::string& field : {std::string(kRootPassword), fresh, fresh}) {
-        t.Send(field);
-        t.SendKey("Enter");
-        ASSERT_TRUE(t.WaitQuiet());
+        t->Send(field);
+        t->SendKey("Enter");
+        ASSERT_TRUE(t->WaitQuiet());
     }
-    ASSERT_TRUE(t.WaitForTextGone("Old Password:")) << t.Dump();
-    ASSERT_TRUE(WaitForMenu(t)) << t.Dump();
-    EXPECT_TRUE(host.ConsoleLog(fresh).empty()) << "the password reached the log";
-    t.SendKey("Esc");
-    ASSERT_TRUE(WaitForWelcome(t)) << t.Dump();
+    ASSERT_TRUE(t->WaitForTextGone("Old Password:"));
+    ASSERT_TRUE(WaitForMenu(*t));
+    EXPECT_TRUE(NotLogged(host, fresh));
+    t->SendKey("Esc");
+    ASSERT_TRUE(WaitForWelcome(*t));
 
-    ASSERT_TRUE(SubmitLogin(t, kRootPassword));
-    ASSERT_TRUE(t.WaitForText("Invalid login or password.")) << t.Dump();
-    t.SendKey("Enter");
-    ASSERT_TRUE(t.WaitForTextGone("Invalid login or password.")) << t.Dump();
-    t.Send(fresh);
-    t.SendKey("Enter");
-    EXPECT_TRUE(WaitForMenu(t)) << t.Dump();
+    ASSERT_TRUE(SubmitLogin(*t, kRootPassword));
+    ASSERT_TRUE(t->WaitForText("Invalid login or password."));
+    t->SendKey("Enter");
+    ASSERT_TRUE(t->WaitForTextGone("Invalid login or password."));
+    t->Send(fresh);
+    t->SendKey("Enter");
+    EXPECT_TRUE(WaitForMenu(*t));
 }
 
-TEST(IdleTimeoutTest, MenuLogsOutAfterAMinuteWithoutKeys) {
-    SimHost host;
-    SetRootPassword(host);
+TEST_F(IdleTimeoutTest, MenuLogsOutAfterAMinuteWithoutKeys) {
     host.Set("/advancedOptions/~1UserVars~1VelkTimeOut", 60);
-    Terminal t(PamConsole(host));
-    ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(LogInToMenu(t)) << t.Dump();
+    ASSERT_TRUE(StartInMenu());
     const auto in = std::chrono::steady_clock::now();
-    ASSERT_TRUE(WaitForWelcome(t, Duration(75000))) << t.Dump();
-    const auto after = std::chrono::steady_clock::now() - in;
-    EXPECT_GE(after, std::chrono::seconds(55));
-    EXPECT_FALSE(t.Contains("System Customization")) << t.Dump();
-    EXPECT_EQ(host.ConsoleLog("User root logged out.", t.Pid()).size(), 1u) << Joined(host.SyslogLines());
+    ASSERT_TRUE(WaitForWelcome(*t, Duration(75000)));
+    EXPECT_GE(std::chrono::steady_clock::now() - in, std::chrono::seconds(55));
+    EXPECT_TRUE(t->Lacks("System Customization"));
+    EXPECT_TRUE(LoggedOnce(host, "User root logged out.", t->Pid()));
 }
 
 }  // namespace

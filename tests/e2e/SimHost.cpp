@@ -107,6 +107,12 @@ SimHost::~SimHost() {
     fs::remove_all(_dir, ec);
 }
 
+void SimHost::InsertCard(const std::string& user, const std::string& pin, int slot) {
+    Tool({"card", _root, "insert", user, pin, "--slot", std::to_string(slot)});
+}
+
+void SimHost::PullCard(int slot) { Tool({"card", _root, "pull", "--slot", std::to_string(slot)}); }
+
 std::string SimHost::Tool(const std::vector<std::string>& args) const {
     std::vector<std::string> argv{VELK_SIMHOST_BIN};
     argv.insert(argv.end(), args.begin(), args.end());

@@ -29,6 +29,11 @@ public:
     void Set(const std::string& pointer, const nlohmann::json& value);
     void Remove(const std::string& pointer);
 
+    // Smart cards: a card for `user` with `pin` as the console secret goes
+    // into reader slot `slot`; Pull takes it out again.
+    void InsertCard(const std::string& user, const std::string& pin, int slot = 0);
+    void PullCard(int slot = 0);
+
     // Files of the host.
     bool Exists(std::string_view hostPath) const;
     std::string ReadFile(std::string_view hostPath) const;

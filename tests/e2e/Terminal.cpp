@@ -28,21 +28,10 @@ int HexDigit(char c) {
 }
 
 void AppendUtf8(std::string& out, uint32_t cp) {
-    if (cp < 0x80) {
-        out += char(cp);
-    } else if (cp < 0x800) {
-        out += char(0xC0 | (cp >> 6));
-        out += char(0x80 | (cp & 0x3F));
-    } else if (cp < 0x10000) {
-        out += char(0xE0 | (cp >> 12));
-        out += char(0x80 | ((cp >> 6) & 0x3F));
-        out += char(0x80 | (cp & 0x3F));
-    } else {
-        out += char(0xF0 | (cp >> 18));
-        out += char(0x80 | ((cp >> 12) & 0x3F));
-        out += char(0x80 | ((cp >> 6) & 0x3F));
-        out += char(0x80 | (cp & 0x3F));
-    }
+    static constexpr uint8_t kLead[] = {0x00, 0xC0, 0xE0, 0xF0};
+    const int more = cp < 0x80 ? 0 : cp < 0x800 ? 1 : cp < 0x10000 ? 2 : 3;  // continuation bytes
+    out += char(kLead[more] | (cp >> (6 * more)));
+    for (int i = more - 1; i >= 0; --i) out += char(0x80 | ((cp >> (6 * i)) & 0x3F));
 }
 
 CellColor ToCellColor(const VTermColor& c, bool foreground) {
@@ -360,34 +349,26 @@ struct termios Terminal::Modes() const {
 }
 
 ::testing::AssertionResult Terminal::WaitForText(std::string_view text, Duration timeout) {
-    const auto deadline = Clock::now() + timeout;
-    {
-        std::unique_lock lock(_mutex);
-        while (!FindLocked(text)) {
-            if (_eof || _changed.wait_until(lock, deadline) == std::cv_status::timeout) {
-                if (FindLocked(text)) break;
-                return ::testing::AssertionFailure()
-                       << "\"" << text << "\" not on the screen"
-                       << (_eof ? " (the program closed the terminal)"
-                                : " after " + std::to_string(timeout.count()) + " ms")
-                       << "\n"
-                       << DumpLocked(false);
-            }
-        }
-    }
-    return WaitQuiet(kQuiet, timeout);
+    return WaitFor(text, true, timeout);
 }
 
 ::testing::AssertionResult Terminal::WaitForTextGone(std::string_view text, Duration timeout) {
+    return WaitFor(text, false, timeout);
+}
+
+::testing::AssertionResult Terminal::WaitFor(std::string_view text, bool shown, Duration timeout) {
     const auto deadline = Clock::now() + timeout;
     {
         std::unique_lock lock(_mutex);
-        while (FindLocked(text)) {
-            if (_eof || _changed.wait_until(lock, deadline) == std::cv_status::timeout) {
-                if (!FindLocked(text)) break;
-                return ::testing::AssertionFailure() << "\"" << text << "\" still on the screen\n"
-                                                     << DumpLocked(false);
-            }
+        auto done = [&] { return FindLocked(text, 1).empty() != shown; };
+        _changed.wait_until(lock, deadline, [&] { return _eof || done(); });
+        if (!done()) {
+            return ::testing::AssertionFailure()
+                   << "\"" << text << (shown ? "\" not on the screen" : "\" still on the screen")
+                   << (_eof ? " (the program closed the terminal)"
+                            : " after " + std::to_string(timeout.count()) + " ms")
+                   << "\n"
+                   << DumpLocked(false);
         }
     }
     return WaitQuiet(kQuiet, timeout);
@@ -521,8 +502,9 @@ std::string Terminal::ScreenText() const {
     return text;
 }
 
-std::optional<Pos> Terminal::FindLocked(std::string_view text) const {
-    for (int row = 0; row < _rows; ++row) {
+std::vector<Pos> Terminal::FindLocked(std::string_view text, size_t most) const {
+    std::vector<Pos> found;
+    for (int row = 0; row < _rows && found.size() < most; ++row) {
         // Byte offset of each cell, to turn a match into a column.
         std::string line;
         std::vector<size_t> starts;
@@ -530,13 +512,14 @@ std::optional<Pos> Terminal::FindLocked(std::string_view text) const {
             starts.push_back(line.size());
             line += CellLocked(col, row).text;
         }
-        size_t at = line.find(text);
-        if (at == std::string::npos) continue;
-        int col = 0;
-        while (col + 1 < _cols && starts[size_t(col) + 1] <= at) ++col;
-        return Pos{col, row};
+        for (size_t at = line.find(text); at != std::string::npos && found.size() < most;
+             at = line.find(text, at + text.size())) {
+            int col = 0;
+            while (col + 1 < _cols && starts[size_t(col) + 1] <= at) ++col;
+            found.push_back({col, row});
+        }
     }
-    return std::nullopt;
+    return found;
 }
 
 ::testing::AssertionResult Terminal::HasTextAt(int col, int row, std::string_view text) const {
@@ -549,29 +532,28 @@ std::optional<Pos> Terminal::FindLocked(std::string_view text) const {
                                          << DumpLocked(false);
 }
 
+::testing::AssertionResult Terminal::Shows(std::string_view text) const {
+    std::lock_guard lock(_mutex);
+    if (!FindLocked(text, 1).empty()) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure() << "\"" << text << "\" not on the screen\n" << DumpLocked(false);
+}
+
+::testing::AssertionResult Terminal::Lacks(std::string_view text) const {
+    std::lock_guard lock(_mutex);
+    if (FindLocked(text, 1).empty()) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure() << "\"" << text << "\" on the screen\n" << DumpLocked(false);
+}
+
 std::optional<Pos> Terminal::Find(std::string_view text) const {
     std::lock_guard lock(_mutex);
-    return FindLocked(text);
+    const std::vector<Pos> found = FindLocked(text, 1);
+    return found.empty() ? std::nullopt : std::optional<Pos>(found[0]);
 }
 
 std::vector<Pos> Terminal::FindAll(std::string_view text) const {
+    if (text.empty()) return {};
     std::lock_guard lock(_mutex);
-    std::vector<Pos> found;
-    if (text.empty()) return found;
-    for (int row = 0; row < _rows; ++row) {
-        std::string line;
-        std::vector<size_t> starts;
-        for (int col = 0; col < _cols; ++col) {
-            starts.push_back(line.size());
-            line += CellLocked(col, row).text;
-        }
-        for (size_t at = line.find(text); at != std::string::npos; at = line.find(text, at + text.size())) {
-            int col = 0;
-            while (col + 1 < _cols && starts[size_t(col) + 1] <= at) ++col;
-            found.push_back({col, row});
-        }
-    }
-    return found;
+    return FindLocked(text, SIZE_MAX);
 }
 
 std::string Terminal::DumpLocked(bool colors) const {

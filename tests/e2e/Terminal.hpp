@@ -158,6 +158,10 @@ public:
     bool Contains(std::string_view text) const { return Find(text).has_value(); }
     // Whether the row reads `text` from column `col` on; the failure shows the screen.
     ::testing::AssertionResult HasTextAt(int col, int row, std::string_view text) const;
+    // Whether `text` is on the screen (Shows) or nowhere on it (Lacks); the
+    // failure shows the screen.
+    ::testing::AssertionResult Shows(std::string_view text) const;
+    ::testing::AssertionResult Lacks(std::string_view text) const;
     // The screen with row numbers; with `colors`, lines with the foreground,
     // background and attributes of every cell below each row.
     std::string Dump(bool colors = false) const;
@@ -171,7 +175,9 @@ public:
 private:
     void ReaderLoop();
     void Feed(const char* data, size_t size);
-    std::optional<Pos> FindLocked(std::string_view text) const;
+    ::testing::AssertionResult WaitFor(std::string_view text, bool shown, Duration timeout);
+    // The first `most` places of `text`, row by row.
+    std::vector<Pos> FindLocked(std::string_view text, size_t most) const;
     Cell CellLocked(int col, int row) const;
     std::string RowLocked(int row) const;
     std::string DumpLocked(bool colors) const;

@@ -95,17 +95,6 @@ const char* LevelName(int level) {
     return names[level & LOG_PRIMASK];
 }
 
-std::string UtcNow() {
-    timespec now;
-    clock_gettime(CLOCK_REALTIME, &now);
-    tm utc;
-    gmtime_r(&now.tv_sec, &utc);
-    char text[80];
-    snprintf(text, sizeof text, "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", utc.tm_year + 1900, utc.tm_mon + 1,
-             utc.tm_mday, utc.tm_hour, utc.tm_min, utc.tm_sec, int(now.tv_nsec / 1000000) % 1000);
-    return text;
-}
-
 // One entry per line: trailing line ends are dropped and other control
 // characters are written as "#" and three octal digits, as syslog daemons do.
 std::string OneLine(const std::string& message) {
@@ -236,7 +225,7 @@ void VSyslog(int priority, const char* format, va_list args) {
     syslog(facility | level, "%s", message.c_str());
 
     if (!logPath.empty()) {
-        std::string line = UtcNow() + " " + ident + "[" + std::to_string(getpid()) +
+        std::string line = UtcTimestamp() + " " + ident + "[" + std::to_string(getpid()) +
                            "]: " + FacilityName(facility) + "." + LevelName(level) + ": " + OneLine(message) +
                            "\n";
         AppendToHostLog(logPath, line);
@@ -249,6 +238,17 @@ void Syslog(int priority, const char* format, ...) {
     va_start(args, format);
     VSyslog(priority, format, args);
     va_end(args);
+}
+
+std::string UtcTimestamp() {
+    timespec now;
+    clock_gettime(CLOCK_REALTIME, &now);
+    tm utc;
+    gmtime_r(&now.tv_sec, &utc);
+    char text[80];
+    snprintf(text, sizeof text, "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", utc.tm_year + 1900, utc.tm_mon + 1,
+             utc.tm_mday, utc.tm_hour, utc.tm_min, utc.tm_sec, int(now.tv_nsec / 1000000) % 1000);
+    return text;
 }
 
 }  // namespace HostCtl::Lib

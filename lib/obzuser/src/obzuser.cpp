@@ -20,17 +20,6 @@ namespace {
 bool g_open = false;
 int g_obzLog = -1;  // the simulated host's observation log while open
 
-std::string UtcNow() {
-    timespec now;
-    clock_gettime(CLOCK_REALTIME, &now);
-    tm utc;
-    gmtime_r(&now.tv_sec, &utc);
-    char stamp[80];
-    snprintf(stamp, sizeof stamp, "%04d-%02d-%02dT%02d:%02d:%02d.%03dZ", utc.tm_year + 1900, utc.tm_mon + 1,
-             utc.tm_mday, utc.tm_hour, utc.tm_min, utc.tm_sec, int(now.tv_nsec / 1000000) % 1000);
-    return stamp;
-}
-
 }  // namespace
 
 int ObzUserLib_Init(void) {
@@ -50,7 +39,7 @@ int ObzUserLib_VAddObz(const char* format, va_list args) {
     HostCtl::Lib::Syslog(LOG_INFO, "%s", event);
     if (g_obzLog < 0) return 0;
 
-    const std::string line = UtcNow() + " obzd: " + event + "\n";
+    const std::string line = HostCtl::Lib::UtcTimestamp() + " obzd: " + event + "\n";
     ssize_t n = write(g_obzLog, line.data(), line.size());
     if (n < 0) return errno;
     return size_t(n) == line.size() ? 0 : EIO;

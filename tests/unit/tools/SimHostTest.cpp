@@ -318,5 +318,36 @@ TEST_F(SimHostPam, ServicesAndDemoLogin) {
     EXPECT_FALSE(fs::exists(_dir + "/bad1/host.json"));
 }
 
+// A card puts its user into the password file with the PIN as secret; a
+// second card for the same user replaces the secret, not the line's service.
+TEST_F(SimHostPam, CardInsertAndPull) {
+    const std::string passdb = _root + "/etc/pam-wrapper/passdb";
+    const std::string before = ReadFile(passdb);
+    ASSERT_EQ(SimHost({"card", _root, "insert", "alice", "1234"}).status, 0);
+    EXPECT_EQ(State()["smartCards"]["slots"][0]["token"]["userIds"], json({"alice"}));
+    EXPECT_EQ(ReadFile(passdb), before + "alice:1234:velk\n");
+    ASSERT_EQ(SimHost({"card", _root, "insert", "guest", "9999"}).status, 0);
+    EXPECT_NE(ReadFile(passdb).find("\nguest:9999:other\n"), std::string::npos) << ReadFile(passdb);
+    ASSERT_EQ(SimHost({"card", _root, "pull", "--slot", "0"}).status, 0);
+    EXPECT_TRUE(State()["smartCards"]["slots"][0]["token"].is_null());
+
+    const std::string state = ReadFile(_root + "/host.json");
+    const std::string users = ReadFile(passdb);
+    for (const std::vector<std::string>& bad :
+         std::vector<std::vector<std::string>>{{"card", _root, "insert", "bob", "1:2"},
+                                               {"card", _root, "insert", "bob", ""},
+                                               {"card", _root, "insert", "bob", "12", "--slot", "7"},
+                                               {"card", _root, "insert", "bob"},
+                                               {"card", _root, "pull", "--slot", "x"},
+                                               {"card", _root, "eject"},
+                                               {"card", _dir + "/missing", "pull"}}) {
+        Result r = SimHost(bad);
+        EXPECT_EQ(r.status, 1) << bad[2];
+        EXPECT_GE(Lines(r.err), 1u) << bad[2];
+    }
+    EXPECT_EQ(ReadFile(_root + "/host.json"), state);
+    EXPECT_EQ(ReadFile(passdb), users);
+}
+
 }  // namespace
 }  // namespace ToolTest

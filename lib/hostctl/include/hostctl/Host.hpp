@@ -45,4 +45,8 @@ void OpenLog(const char* ident, int option, int facility);
 void Syslog(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
 void VSyslog(int priority, const char* format, va_list args);
 
+// The time now as "2026-11-23T08:15:02.345Z" (UTC, milliseconds), the stamp
+// of the simulated host's log lines.
+std::string UtcTimestamp();
+
 }  // namespace HostCtl::Lib

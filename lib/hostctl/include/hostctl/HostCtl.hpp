@@ -175,7 +175,8 @@ private:
 
 class AdvancedIntegerOption : public AdvancedOption {
 public:
-    AdvancedIntegerOption(std::string name, int64_t current) : AdvancedOption(std::move(name)), _current(current) {}
+    AdvancedIntegerOption(std::string name, int64_t current)
+        : AdvancedOption(std::move(name)), _current(current) {}
     int64_t GetCurrent() const { return _current; }
     void SetCurrent(int64_t value);  // writes to the host
 
