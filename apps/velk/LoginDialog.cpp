@@ -99,8 +99,14 @@ int LoginDialog::Run() {
         } else if (key == KEY_F(3)) {
             SetMode(!_pinMode);
         } else if (key == '\n' && current == _keyboard) {
-            KeyboardDialog keyboard(this);
-            keyboard.Execute();
+            try {
+                KeyboardDialog keyboard(this);
+                keyboard.Execute();
+            } catch (const HostCtl::Lib::HostCtlException& e) {
+                // The login goes on with the layout the host has now.
+                Syslog(LOG_ERR, "%s %s", _factory->GetString(21), e.what());
+                MessageDialog(this, 17, 21).Execute();
+            }
             _keyboard->SetText(KeyboardLabel());
         } else if ((key == '\t' || key == '\n') && !onLast) {
             _list->Down();

@@ -239,9 +239,12 @@ void WelcomeWindow::OnLoginKey(int key) {
         dialog.Execute();
         return;
     }
-    {
+    try {
         LoginDialog login(this);
         if (login.Execute() != 1) return;
+    } catch (const VelkTimeout&) {
+        // Nobody finished logging in: the welcome screen is drawn again.
+        return;
     }
     try {
         if (key == KEY_F(2)) {
