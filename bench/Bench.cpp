@@ -1,7 +1,9 @@
 // Measures the console against a minimal ncurses menu program in the same run
 // and prints each figure of both beside their ratio: time to the first frame
 // and the bytes it took at 80x25 on TERM=linux, bytes and latency per Up/Down
-// key in the main menu, peak resident memory, and wake-ups over 5 idle seconds.
+// key in the main menu and in the management network menu (both against the
+// minimal program's one menu), peak resident memory, and wake-ups over 5 idle
+// seconds.
 // Ratios, not absolute times, are what to compare between runs and machines.
 #include <dirent.h>
 #include <unistd.h>
@@ -59,14 +61,20 @@ long WakeUps(pid_t pid) {
     return total;
 }
 
+struct KeyFigures {
+    double bytesPerKey = 0;
+    double latencyMs = 0;
+};
+
 struct Figures {
     double firstFrameMs = 0;
     double firstFrameBytes = 0;
-    double bytesPerKey = 0;
-    double keyLatencyMs = 0;
+    KeyFigures menuKeys;
+    KeyFigures networkKeys;
     double peakRssKb = 0;
     double idleWakeUps = 0;
     bool menu = false;
+    bool network = false;
 };
 
 // Waits until output stops for `quiet`; returns when the last byte came.
@@ -90,10 +98,27 @@ Clock::time_point SettleAfter(Terminal& t, size_t before, Clock::time_point sent
     return first == Clock::time_point{} ? sent : first;
 }
 
+// Bytes and latency of kKeys Up/Down keys in the menu on screen; the
+// selection ends where it started.
+KeyFigures MeasureKeys(Terminal& t) {
+    std::vector<double> latencies;
+    const size_t start = t.BytesReceived();
+    for (int i = 0; i < kKeys; ++i) {
+        const size_t before = t.BytesReceived();
+        auto sent = Clock::now();
+        t.SendKey(i % 8 < 4 ? "Down" : "Up");
+        auto first = SettleAfter(t, before, sent);
+        latencies.push_back(std::chrono::duration<double, std::milli>(first - sent).count());
+    }
+    return {static_cast<double>(t.BytesReceived() - start) / kKeys, Median(latencies)};
+}
+
 // Runs one program kRuns times for the first frame, then once more for the
-// menu keys, memory and idle figures. `toMenu` brings it into its menu.
+// menu keys, memory and idle figures. `toMenu` brings it into its menu,
+// `toNetwork` (may be empty) from there into a second menu.
 Figures Measure(const std::function<TerminalOptions()>& options, const std::string& frameText,
-                const std::function<bool(Terminal&)>& toMenu) {
+                const std::function<bool(Terminal&)>& toMenu,
+                const std::function<bool(Terminal&)>& toNetwork) {
     Figures f;
     std::vector<double> times, bytes;
     for (int i = 0; i < kRuns; ++i) {
@@ -111,17 +136,11 @@ Figures Measure(const std::function<TerminalOptions()>& options, const std::stri
     Terminal t(options());
     if (t.WaitForText(frameText) && toMenu(t)) {
         f.menu = true;
-        std::vector<double> latencies;
-        const size_t start = t.BytesReceived();
-        for (int i = 0; i < kKeys; ++i) {
-            const size_t before = t.BytesReceived();
-            auto sent = Clock::now();
-            t.SendKey(i % 8 < 4 ? "Down" : "Up");
-            auto first = SettleAfter(t, before, sent);
-            latencies.push_back(std::chrono::duration<double, std::milli>(first - sent).count());
+        f.menuKeys = MeasureKeys(t);
+        if (toNetwork && toNetwork(t)) {
+            f.network = true;
+            f.networkKeys = MeasureKeys(t);
         }
-        f.bytesPerKey = static_cast<double>(t.BytesReceived() - start) / kKeys;
-        f.keyLatencyMs = Median(latencies);
     }
     t.WaitQuiet(std::chrono::milliseconds(300));
     const std::string status = "/proc/" + std::to_string(t.Pid()) + "/status";
@@ -164,8 +183,12 @@ int Check(const Figures& velk, const Figures& minimal) {
         fail("bytes to first frame", kMaxFirstFrameBytesRatio);
     if (!velk.menu)
         fail("could not log in to the main menu", 0);
-    else if (velk.bytesPerKey > kMaxBytesPerKeyRatio * minimal.bytesPerKey)
+    else if (velk.menuKeys.bytesPerKey > kMaxBytesPerKeyRatio * minimal.menuKeys.bytesPerKey)
         fail("bytes per Up/Down key", kMaxBytesPerKeyRatio);
+    if (!velk.network)
+        fail("could not open the management network menu", 0);
+    else if (velk.networkKeys.bytesPerKey > kMaxBytesPerKeyRatio * minimal.menuKeys.bytesPerKey)
+        fail("bytes per Up/Down key in the network menu", kMaxBytesPerKeyRatio);
     if (velk.idleWakeUps > 0) fail("the console woke up while idle", 0);
     return failures == 0 ? 0 : 1;
 }
@@ -208,17 +231,32 @@ int main(int argc, char** argv) {
         t.SendKey("Enter");
         return static_cast<bool>(t.WaitForText("System Customization"));
     };
-    Figures velk = Measure(velkOptions, "<F12>", login);
-    Figures minimal = Measure(minimalOptions, "Reset System Configuration", [](Terminal&) { return true; });
+    // From "Configure Password" down to "Configure Management Network".
+    auto toNetwork = [](Terminal& t) {
+        for (int i = 0; i < 3; ++i) t.SendKey("Down");
+        t.SendKey("Enter");
+        return static_cast<bool>(t.WaitForText("<Esc> Exit"));
+    };
+    Figures velk = Measure(velkOptions, "<F12>", login, toNetwork);
+    Figures minimal = Measure(
+        minimalOptions, "Reset System Configuration", [](Terminal&) { return true; }, nullptr);
 
     std::printf("%-28s %12s %12s %11s\n", "80x25, TERM=linux", "velk", "minimal", "ratio");
     Row("time to first frame", velk.firstFrameMs, minimal.firstFrameMs, "ms (median)");
     Row("bytes to first frame", velk.firstFrameBytes, minimal.firstFrameBytes, "bytes");
     if (velk.menu) {
-        Row("bytes per Up/Down key", velk.bytesPerKey, minimal.bytesPerKey, "bytes");
-        Row("latency per Up/Down key", velk.keyLatencyMs, minimal.keyLatencyMs, "ms (median, to first byte)");
+        Row("bytes per Up/Down key", velk.menuKeys.bytesPerKey, minimal.menuKeys.bytesPerKey, "bytes");
+        Row("latency per Up/Down key", velk.menuKeys.latencyMs, minimal.menuKeys.latencyMs,
+            "ms (median, to first byte)");
     } else {
         std::printf("%-28s could not log in to the main menu\n", "menu keys");
+    }
+    if (velk.network) {
+        Row("bytes per key, network", velk.networkKeys.bytesPerKey, minimal.menuKeys.bytesPerKey, "bytes");
+        Row("latency per key, network", velk.networkKeys.latencyMs, minimal.menuKeys.latencyMs,
+            "ms (median, to first byte)");
+    } else {
+        std::printf("%-28s could not open the management network menu\n", "network keys");
     }
     Row("peak resident memory", velk.peakRssKb, minimal.peakRssKb, "KiB");
     Row("wake-ups in 5 idle seconds", velk.idleWakeUps, minimal.idleWakeUps, "context switches");

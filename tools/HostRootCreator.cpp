@@ -15,7 +15,10 @@
 #include <system_error>
 #include <vector>
 
+#include "NetworkShapes.hpp"
 #include "ToolSupport.hpp"
+#include "hostctl/Host.hpp"
+#include "hostctl/SimNetwork.hpp"
 #include "hostctl/SimState.hpp"
 
 extern char** environ;
@@ -204,10 +207,14 @@ std::string Text(const json& state, const std::string& pointer) {
 // A few lines of each of the host's logs, so that the log viewer has
 // something to show.
 std::vector<std::pair<std::string, std::string>> Logs(const json& state, const std::string& fqdn) {
-    std::string t = NowIso8601();
+    std::string t = HostCtl::Lib::UtcTimestamp();
     std::string version = Text(state, "/version/version");
     std::string build = Text(state, "/version/build");
-    std::string address = Text(state, "/network/vnics/0/ipv4/address");
+    std::string address = "no IPv4 address";
+    for (const json& vnic : state.at("network").at("vnics"))
+        if (vnic.at("name") == state.at("network").at("managementInterface") &&
+            vnic.at("ipv4").at("address") != "0.0.0.0")
+            address = vnic.at("ipv4").at("address");
     std::string nic = Text(state, "/network/pnics/0/name");
     return {
         {"syslog.log", t + " sysboot[412]: daemon.info: Starting the host's services\n" + t +
@@ -352,21 +359,23 @@ std::string CreateHostRoot(const HostRootOptions& options) {
     if (!options.password.empty() && !IsValidPassword(options.password))
         Fail("bad password: it may not hold ':' or line breaks");
 
+    json state = HostCtl::Lib::DefaultHostState(options.hostname);
+    ApplyNetworkShapes(state, options.networkShapes);
+
     fs::path root = PrepareRoot(options);
     for (const char* dir : {"bin", "sbin", "dev", "etc/ssh", "etc/zolva/ssl", "var/log", "var/run/zolva",
                             "usr/lib/zolva/openssh/bin"})
         MakeDirectories(root / dir);
 
-    json state = HostCtl::Lib::DefaultHostState(options.hostname);
     HostCtl::Lib::SimState(root.string()).Replace(state);
 
     std::string fqdn = options.hostname;
     std::string shortName = Text(state, "/network/dns/hostname");
+    // The loopback lines, then the host's own line as the host control
+    // library keeps it.
     WriteFile(root / "etc/hosts",
-              "127.0.0.1\tlocalhost.localdomain localhost\n::1\tlocalhost.localdomain localhost\n" +
-                  Text(state, "/network/vnics/0/ipv4/address") + "\t" + fqdn +
-                  (fqdn == shortName ? std::string() : " " + shortName) + "\n",
-              0644);
+              "127.0.0.1\tlocalhost.localdomain localhost\n::1\tlocalhost.localdomain localhost\n", 0644);
+    HostCtl::Lib::SyncHostsFile(root.string(), state);
 
     MakeCertificate(root, fqdn);
     MakeSshKey(root / "etc/ssh/ssh_host_rsa_key", "rsa", "root@" + shortName, true);

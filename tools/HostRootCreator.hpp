@@ -4,19 +4,22 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 namespace VelkTools {
 
 struct HostRootOptions {
     std::string root;
     std::string hostname = "host1";
-    bool force = false;             // create over an existing, non-empty folder
-    std::string hostCommandBinary;  // absolute path of velk-hostcmd
-    std::string password;           // root's console password; empty: a generated "demo-xxxxxx"
+    bool force = false;                      // create over an existing, non-empty folder
+    std::string hostCommandBinary;           // absolute path of velk-hostcmd
+    std::string password;                    // root's console password; empty: a generated "demo-xxxxxx"
+    std::vector<std::string> networkShapes;  // see NetworkShapes.hpp
 };
 
 // Creates the host and returns its root as an absolute path. Throws
-// std::runtime_error with a one-line text on any failure.
+// std::runtime_error (or HostCtlException) with a one-line text on any
+// failure; the network shapes are checked before anything is made.
 std::string CreateHostRoot(const HostRootOptions& options);
 
 // The PAM service folder of a host root (ROOT/etc/pam-wrapper) and its

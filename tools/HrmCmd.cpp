@@ -127,12 +127,11 @@ int HrmCmd(SimState& sim, const std::vector<std::string>& args, std::string& out
             outcome = Outcome{1, "", "Unknown command '" + command + "'\n"};
         else
             outcome = handler->second(sim, state);
-        AppendHistory(sim, state,
-                      {{"tool", "hrm-cmd"},
-                       {"user", user},
-                       {"command", command},
-                       {"args", commandArgs},
-                       {"status", outcome.status}});
+        sim.AppendHistory(state, {{"tool", "hrm-cmd"},
+                                  {"user", user},
+                                  {"command", command},
+                                  {"args", commandArgs},
+                                  {"status", outcome.status}});
     });
     out = outcome.out;
     err = outcome.err;

@@ -18,7 +18,7 @@ int PowerOffVms(SimState& sim, const std::vector<std::string>& args, std::string
     sim.Read();  // a missing or malformed state fails here, before anything is written
     sim.Update([&](json& state) {
         ObjectMember(sim, state, "", "vms")["running"] = 0;
-        AppendHistory(sim, state, {{"tool", "powerOffVms"}, {"args", args}});
+        sim.AppendHistory(state, {{"tool", "powerOffVms"}, {"args", args}});
     });
     out.clear();
     return 0;

@@ -19,7 +19,7 @@ void Record(SimState& sim, const std::string& tool, const std::vector<std::strin
     sim.Read();  // a missing or malformed state fails here, before anything is written
     sim.Update([&](json& state) {
         change(ObjectMember(sim, state, "", "power"));
-        AppendHistory(sim, state, {{"tool", tool}, {"args", args}});
+        sim.AppendHistory(state, {{"tool", tool}, {"args", args}});
     });
 }
 

@@ -1,5 +1,7 @@
 // velk-simhost: creates a simulated host and reads or changes its state.
-//   velk-simhost create ROOT [--hostname NAME] [--password P] [--force]
+//   velk-simhost create ROOT [--hostname NAME] [--password P] [--network SHAPE[,SHAPE...]] [--force]
+//   velk-simhost boot ROOT
+//   velk-simhost fail ROOT OPERATION [MESSAGE | --clear]
 //   velk-simhost login ROOT
 //   velk-simhost get ROOT POINTER
 //   velk-simhost set ROOT POINTER VALUE
@@ -10,13 +12,17 @@
 // as a string.
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <filesystem>
 #include <string>
 #include <vector>
 
 #include "HostRootCreator.hpp"
+#include "NetworkShapes.hpp"
 #include "StateEdit.hpp"
+#include "ToolSupport.hpp"
+#include "hostctl/SimNetwork.hpp"
 #include "hostctl/SimState.hpp"
 
 namespace {
@@ -25,13 +31,30 @@ namespace fs = std::filesystem;
 using nlohmann::json;
 
 const char* const USAGE =
-    "usage: velk-simhost create ROOT [--hostname NAME] [--password P] [--force]\n"
+    "usage: velk-simhost create ROOT [--hostname NAME] [--password P] [--network SHAPE[,SHAPE...]] "
+    "[--force]\n"
+    "       velk-simhost boot ROOT\n"
+    "       velk-simhost fail ROOT OPERATION [MESSAGE | --clear]\n"
     "       velk-simhost login ROOT\n"
     "       velk-simhost get ROOT POINTER\n"
     "       velk-simhost set ROOT POINTER VALUE\n"
     "       velk-simhost remove ROOT POINTER\n"
     "       velk-simhost card ROOT insert USER PIN [--slot N]\n"
-    "       velk-simhost card ROOT pull [--slot N]\n";
+    "       velk-simhost card ROOT pull [--slot N]\n"
+    "\n"
+    "create --network changes the default network (4 NICs, management interface qk0 on VLAN 0 by\n"
+    "DHCP, IPv6 with router advertisement); shapes combine:\n"
+    "  single-nic  only zonic0\n"
+    "  dvs         qk0 on port 100 of distributed switch kDS-1 (uplinks zonic0, zonic1), VLAN 0\n"
+    "  ipv4-off    qk0 without IPv4\n"
+    "  ipv6-off    IPv6 off now and at the next boot\n"
+    "  no-dhcp     no DHCP server on VLAN 0: qk0 gets no address\n"
+    "  static      qk0 static 192.0.2.10/24, gateway 192.0.2.1, DNS 192.0.2.53\n"
+    "boot: boots the host: saved DNS and routing, IPv6 as set for the boot, every enabled\n"
+    "  interface configured anew from the simulated network; power state \"on\".\n"
+    "fail: makes the host control operation OPERATION (a backend method name such as\n"
+    "  SetVnicIpConfig or GetPnics) fail with MESSAGE (default \"simulated failure of\n"
+    "  OPERATION\") until cleared with --clear.\n";
 
 int Usage(const std::string& problem) {
     if (!problem.empty()) std::fprintf(stderr, "velk-simhost: %s\n", problem.c_str());
@@ -72,6 +95,13 @@ int Create(const std::vector<std::string>& args) {
         } else if (args[i] == "--hostname") {
             if (i + 1 >= args.size()) return Usage("--hostname needs a name");
             options.hostname = args[++i];
+        } else if (args[i] == "--network") {
+            if (i + 1 >= args.size()) return Usage("--network needs one or more shapes");
+            try {
+                VelkTools::ParseNetworkShapes(args[++i], options.networkShapes);
+            } catch (const std::runtime_error& e) {
+                return Usage(e.what());
+            }
         } else if (args[i] == "--password") {
             if (i + 1 >= args.size()) return Usage("--password needs a password");
             options.password = args[++i];
@@ -89,6 +119,40 @@ int Create(const std::vector<std::string>& args) {
     if (!haveRoot || options.root.empty()) return Usage("no host root given");
     std::string root = VelkTools::CreateHostRoot(options);
     std::printf("Created the simulated host %s in %s\n", options.hostname.c_str(), root.c_str());
+    return 0;
+}
+
+// Boots the host: its network comes up from the saved configuration and the
+// simulated physical network, and the host is on.
+int Boot(const std::vector<std::string>& args) {
+    if (args.size() != 1) return Usage("boot takes ROOT");
+    HostCtl::Lib::BootSimulatedHost(args[0]);
+    return 0;
+}
+
+// Sets or clears a fault: the named host control operation fails with the
+// message until the fault is cleared.
+int Fail(const std::vector<std::string>& args) {
+    if (args.size() < 2 || args.size() > 3) return Usage("fail takes ROOT OPERATION [MESSAGE | --clear]");
+    const std::string& operation = args[1];
+    const std::vector<std::string>& known = HostCtl::Lib::SimulatedOperations();
+    if (std::find(known.begin(), known.end(), operation) == known.end()) {
+        std::string list;
+        for (const std::string& name : known) list += (list.empty() ? "" : " ") + name;
+        return Error("unknown operation \"" + operation + "\"; the operations are: " + list);
+    }
+    const bool clear = args.size() == 3 && args[2] == "--clear";
+    const std::string message = args.size() == 3 ? args[2] : "simulated failure of " + operation;
+    if (!clear && message.empty()) return Usage("the message of a fault may not be empty");
+    HostCtl::Lib::SimState sim(args[0]);
+    sim.Read();  // a missing or malformed state is reported before anything is made
+    sim.Update([&](json& state) {
+        json& faults = VelkTools::ObjectMember(sim, state, "", "faults");
+        if (clear)
+            faults.erase(operation);
+        else
+            faults[operation] = message;
+    });
     return 0;
 }
 
@@ -182,6 +246,8 @@ int main(int argc, char** argv) {
     }
     try {
         if (command == "create") return Create(args);
+        if (command == "boot") return Boot(args);
+        if (command == "fail") return Fail(args);
         if (command == "login") return Login(args);
         if (command == "get" || command == "set" || command == "remove") return Edit(command, args);
         if (command == "card") return Card(args);

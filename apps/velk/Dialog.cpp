@@ -33,6 +33,22 @@ void Dialog::SetTitle(const std::string& text) { _title->SetText(text); }
 void Dialog::SetDescription(const std::string& text) { _description->SetText(text); }
 void Dialog::SetFooter(const std::string& text) { _footer->SetText(text); }
 
+int Dialog::RunForm(const std::function<void()>& draw, const std::function<bool()>& accept,
+                    const std::function<void(int)>& onKey) {
+    draw();
+    for (;;) {
+        const int key = GetKey(true);
+        if (key == 27 || (key == '\n' && accept())) {
+            SetCursor(false);
+            return key == '\n';
+        }
+        if (key == '\n')
+            draw();
+        else
+            onKey(key);
+    }
+}
+
 ItemList* Dialog::NewContentList(const std::vector<Item*>& items) {
     auto* list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
     list->SetItems(items);

@@ -3,6 +3,7 @@
 // footer line of key hints.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -30,6 +31,19 @@ protected:
         "{color:black}<Up/Down>{/color} {color:dark-grey}Select{/color}  {color:black}<Space>{/color} "
         "{color:dark-grey}Toggle Selected{/color}{align:right}{color:black}<Enter>{/color} "
         "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}";
+
+    // Footer of a dialog whose radio rows are marked with Space.
+    static constexpr const char* MARK_LIST_FOOTER =
+        "{color:black}<Up/Down>{/color} {color:dark-grey}Select{/color}  {color:black}<Space>{/color} "
+        "{color:dark-grey}Mark Selected{/color}{align:right}{color:black}<Enter>{/color} "
+        "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}";
+
+    // The key loop of a form: Esc ends it with false, Enter with true once
+    // `accept` agrees (after a refusal `draw` shows the dialog again), and
+    // every other key goes to `onKey`. `draw` also draws the dialog first.
+    // The text cursor is hidden when the loop ends.
+    int RunForm(const std::function<void()>& draw, const std::function<bool()>& accept,
+                const std::function<void(int)>& onKey);
 
     // A list filling the content window, showing `items` (still owned by
     // the caller); the caller deletes the list.

@@ -13,6 +13,7 @@
 #include "KeyboardDialog.hpp"
 #include "ManagementInterface.hpp"
 #include "MessageDialog.hpp"
+#include "NetworkWindow.hpp"
 #include "RestoreDialog.hpp"
 #include "StringFactory.hpp"
 #include "hostctl/Host.hpp"
@@ -284,8 +285,10 @@ void GeneralWindow::OpenEntry(int textId) {
         case 16:
             screen = std::make_unique<KeyboardDialog>(this);
             break;
-        case 6:
         case 8:
+            screen = std::make_unique<NetworkWindow>(this);
+            break;
+        case 6:
         case 9:
         case 10:
         case 11:

@@ -102,9 +102,25 @@ bool InputItem::HandleKey(int key) {
     }
     if (key < 0 || key > 255 || !std::isprint(key)) return false;
     if (_fresh) Clear();
+    if (_maxLength >= 0 && Length() >= _maxLength) return true;
     _text.insert(static_cast<size_t>(_position), 1, static_cast<char>(key));
     ++_position;
     return true;
+}
+
+bool InputItem::IsEditingKey(int key) {
+    switch (key) {
+        case kBackspaceByte:
+        case KEY_BACKSPACE:
+        case KEY_DC:
+        case KEY_LEFT:
+        case KEY_RIGHT:
+        case KEY_HOME:
+        case KEY_END:
+            return true;
+        default:
+            return false;
+    }
 }
 
 void InputItem::Draw(TextArea* area) {

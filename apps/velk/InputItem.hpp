@@ -26,8 +26,17 @@ public:
     void Draw(TextArea* area) override;
 
     // Applies an editing key (Home, End, Left, Right, Delete, Backspace or a
-    // printable character); false for any other key, which is ignored.
+    // printable character); false for any other key, which is ignored. A
+    // printable character that would make the text longer than the maximum
+    // length is ignored too (and answers true: the key was the field's).
     bool HandleKey(int key);
+
+    // The keys that move within a field or delete from it: Backspace (the
+    // byte 8 and curses' code), Delete, Left, Right, Home and End.
+    static bool IsEditingKey(int key);
+
+    // Caps the text at `length` characters; -1 (the default) sets no cap.
+    void SetMaxLength(int length) { _maxLength = length; }
 
     // Replaces the text; the field is fresh again with the cursor at the end.
     void SetText(const std::string& text);
@@ -55,6 +64,7 @@ private:
     std::string _text;
     int _fieldWidth;
     bool _masked = false;
+    int _maxLength = -1;
     int _position;
     int _offset = 0;
     bool _fresh = true;

@@ -30,6 +30,12 @@ public:
     bool IsFocused() const { return _focused; }
     bool IsActive() const { return _active; }
     void SetActive(bool active) { _active = active; }
+    // Active and drawn in black, or passed over and drawn in dark grey (a
+    // dialog's rows that the current choice makes meaningless).
+    void SetEnabled(bool enabled) {
+        _active = enabled;
+        _fg = enabled ? BLACK : DARK_GREY;
+    }
     // Colours of the row while the item is not the current one.
     int GetBg() const { return _bg; }
     int GetFg() const { return _fg; }

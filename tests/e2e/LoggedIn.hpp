@@ -67,7 +67,8 @@ std::string Joined(const std::vector<std::string>& lines);
 // it before that.
 class ConsoleTest : public ::testing::Test {
 protected:
-    ConsoleTest() { SetRootPassword(host); }
+    // `network`: the host's shape (velk-simhost create --network).
+    explicit ConsoleTest(const std::string& network = "") : host("host1", network) { SetRootPassword(host); }
 
     // Starts the console and waits for the welcome screen.
     ::testing::AssertionResult Start(const std::string& term = "linux");

@@ -84,14 +84,16 @@ bool Keep() {
 
 }  // namespace
 
-SimHost::SimHost(const std::string& hostname) {
+SimHost::SimHost(const std::string& hostname, const std::string& network) {
     const char* tmp = getenv("TMPDIR");
     std::string pattern = std::string(tmp && *tmp ? tmp : "/tmp") + "/velk-e2e-XXXXXX";
     if (!mkdtemp(pattern.data())) throw std::runtime_error("mkdtemp " + pattern + ": " + strerror(errno));
     _dir = pattern;
     _root = _dir + "/host";
     try {
-        Tool({"create", _root, "--hostname", hostname});
+        std::vector<std::string> args{"create", _root, "--hostname", hostname};
+        if (!network.empty()) args.insert(args.end(), {"--network", network});
+        Tool(args);
     } catch (...) {
         if (!Keep()) fs::remove_all(_dir);
         throw;
@@ -110,6 +112,16 @@ SimHost::~SimHost() {
 void SimHost::InsertCard(const std::string& user, const std::string& pin, int slot) {
     Tool({"card", _root, "insert", user, pin, "--slot", std::to_string(slot)});
 }
+
+void SimHost::Fail(const std::string& operation, const std::string& message) {
+    std::vector<std::string> args{"fail", _root, operation};
+    if (!message.empty()) args.push_back(message);
+    Tool(args);
+}
+
+void SimHost::Clear(const std::string& operation) { Tool({"fail", _root, operation, "--clear"}); }
+
+void SimHost::Boot() { Tool({"boot", _root}); }
 
 void SimHost::PullCard(int slot) { Tool({"card", _root, "pull", "--slot", std::to_string(slot)}); }
 

@@ -14,7 +14,9 @@ namespace E2e {
 
 class SimHost {
 public:
-    explicit SimHost(const std::string& hostname = "host1");
+    // `network`: shapes for velk-simhost create --network ("dvs,ipv6-off"),
+    // "" for the default host.
+    explicit SimHost(const std::string& hostname = "host1", const std::string& network = "");
     ~SimHost();
     SimHost(const SimHost&) = delete;
     SimHost& operator=(const SimHost&) = delete;
@@ -28,6 +30,13 @@ public:
     nlohmann::json Get(const std::string& pointer) const;
     void Set(const std::string& pointer, const nlohmann::json& value);
     void Remove(const std::string& pointer);
+
+    // Makes the host control operation fail with `message` (the tool's
+    // default text when empty) until Clear is called for it.
+    void Fail(const std::string& operation, const std::string& message = "");
+    void Clear(const std::string& operation);
+    // Completes a reboot: the host comes up with its saved configuration.
+    void Boot();
 
     // Smart cards: a card for `user` with `pin` as the console secret goes
     // into reader slot `slot`; Pull takes it out again.

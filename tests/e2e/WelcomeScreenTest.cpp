@@ -74,10 +74,10 @@ TEST_P(WelcomeLayoutTest, TextsInTheirPlaces) {
     EXPECT_TRUE(t.HasTextAt(8, 10, "16 GiB Memory   "));
     EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow(), "Download tools to manage this host from:   "));
     EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 1, "http://host1/   "));
-    EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 2, "http://192.168.10.21/ (DHCP)   "));
+    EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 2, "http://192.0.2.100/ (DHCP)   "));
     EXPECT_TRUE(t.HasTextAt(8, l.NetworkRow() + 3, "http://[fe80::250:56ff:fe01:2]/ (AUTOCONF)   "));
     EXPECT_EQ(NetworkText(t),
-              "Download tools to manage this host from: http://host1/ http://192.168.10.21/ (DHCP) "
+              "Download tools to manage this host from: http://host1/ http://192.0.2.100/ (DHCP) "
               "http://[fe80::250:56ff:fe01:2]/ (AUTOCONF)");
     EXPECT_EQ(WarningText(t), "");
 
@@ -202,30 +202,30 @@ const ValueCase kValueCases[] = {
      {{"/network/vnics/0/ipv4/address", "10.0.0.7"}, {"/network/vnics/0/ipv4/dhcp", false}},
      kDownload + " http://host1/ http://10.0.0.7/ (STATIC) " + kLinkLocal,
      {"http://10.0.0.7/ (STATIC)"},
-     {"192.168.10.21", "(DHCP)"}},
+     {"192.0.2.100", "(DHCP)"}},
     {"Ipv4Off",
      {{"/network/vnics/0/ipv4/none", true}},
      kDownload + " http://host1/ " + kLinkLocal,
      {},
-     {"http://192.168.10.21/"}},
+     {"http://192.0.2.100/"}},
     {"NewHostName",
      {{"/network/dns/hostname", "lab-07"}},
-     kDownload + " http://lab-07/ http://192.168.10.21/ (DHCP) " + kLinkLocal},
+     kDownload + " http://lab-07/ http://192.0.2.100/ (DHCP) " + kLinkLocal},
     {"LocalhostNotLinked",
      {{"/network/dns/hostname", "localhost"}},
-     kDownload + " http://192.168.10.21/ (DHCP) " + kLinkLocal,
+     kDownload + " http://192.0.2.100/ (DHCP) " + kLinkLocal,
      {},
      {"http://localhost", "http://host1"}},
     {"EmptyHostNameNotLinked",
      {{"/network/dns/hostname", ""}},
-     kDownload + " http://192.168.10.21/ (DHCP) " + kLinkLocal,
+     kDownload + " http://192.0.2.100/ (DHCP) " + kLinkLocal,
      {},
      {"http:///"}},
     {"WaitingForDhcp",
      {{"/network/vnics/0/ipv4/address", "0.0.0.0"}},
      std::nullopt,
      {"Waiting for DHCP..."},
-     {"http://192.168.10.21/"},
+     {"http://192.0.2.100/"},
      "Warning: DHCP lookup failed. You may be unable to access this system until you customize its network "
      "configuration.",
      40},
@@ -241,26 +241,25 @@ const ValueCase kValueCases[] = {
      {{"/network/vnics/0/ipv6/addresses",
        json::array(
            {Ipv6("2001:db8::5", "static"), Ipv6("2001:db8::6", "dhcp"), Ipv6("fe80::1", "autoconf")})}},
-     kDownload + " http://host1/ http://192.168.10.21/ (DHCP) http://[2001:db8::5]/ (STATIC) "
+     kDownload + " http://host1/ http://192.0.2.100/ (DHCP) http://[2001:db8::5]/ (STATIC) "
                  "http://[2001:db8::6]/ (DHCP) http://[fe80::1]/ (AUTOCONF)",
      {"http://[2001:db8::5]/ (STATIC)", "http://[2001:db8::6]/ (DHCP)", "http://[fe80::1]/ (AUTOCONF)"}},
     {"FiveIpv6AllListed",
      {{"/network/dns/hostname", "localhost"}, {"/network/vnics/0/ipv6/addresses", Ipv6List(5)}},
      kDownload +
-         " http://192.168.10.21/ (DHCP) http://[2001:db8::1]/ (STATIC) http://[2001:db8::2]/ (STATIC) "
+         " http://192.0.2.100/ (DHCP) http://[2001:db8::1]/ (STATIC) http://[2001:db8::2]/ (STATIC) "
          "http://[2001:db8::3]/ (STATIC) http://[2001:db8::4]/ (STATIC) http://[2001:db8::5]/ (STATIC)",
      {},
      {"..."}},
     {"SixIpv6FourListed",
      {{"/network/dns/hostname", "localhost"}, {"/network/vnics/0/ipv6/addresses", Ipv6List(6)}},
-     kDownload +
-         " http://192.168.10.21/ (DHCP) http://[2001:db8::1]/ (STATIC) http://[2001:db8::2]/ (STATIC) "
-         "http://[2001:db8::3]/ (STATIC) http://[2001:db8::4]/ (STATIC) ...",
+     kDownload + " http://192.0.2.100/ (DHCP) http://[2001:db8::1]/ (STATIC) http://[2001:db8::2]/ (STATIC) "
+                 "http://[2001:db8::3]/ (STATIC) http://[2001:db8::4]/ (STATIC) ...",
      {},
      {"2001:db8::5", "2001:db8::6"}},
     {"Ipv6Disabled",
      {{"/network/ipv6Enabled", false}},
-     kDownload + " http://host1/ http://192.168.10.21/ (DHCP)",
+     kDownload + " http://host1/ http://192.0.2.100/ (DHCP)",
      {},
      {"http://["}},
     {"NoAdapters", {{"/network/pnics", json::array()}}, kNoAdapter, {}, {"http://", kDownload}},
@@ -307,7 +306,7 @@ TEST_P(WelcomeValuesTest, ShownAfterRefreshSignal) {
     SimHost host;
     Terminal t(host.Console("linux", 80, c.rows));
     ASSERT_TRUE(WaitForWelcome(t));
-    ASSERT_TRUE(t.Shows("http://192.168.10.21/ (DHCP)"));
+    ASSERT_TRUE(t.Shows("http://192.0.2.100/ (DHCP)"));
     for (const auto& [pointer, value] : c.changes) host.Set(pointer, value);
     t.Signal(SIGUSR1);
     const auto deadline = std::chrono::steady_clock::now() + kDefaultTimeout;
@@ -347,7 +346,7 @@ TEST(WelcomeScreenTest, MissingAdapterAlertRaisedOncePerRun) {
                                   {"speedMbps", 1000},
                                   {"description", "Acme Gigabit Ethernet Controller"}});
     t.Signal(SIGUSR1);
-    EXPECT_TRUE(t.WaitForText("http://192.168.10.21/ (DHCP)"));
+    EXPECT_TRUE(t.WaitForText("http://192.0.2.100/ (DHCP)"));
     EXPECT_TRUE(t.Lacks("No compatible network adapter"));
 }
 

@@ -91,9 +91,6 @@ void DriverVmInfoImpl::SetOwned(const std::vector<std::string>& ownedIds) {
 
 namespace Network {
 
-using HostCtl::Lib::DnsSettings;
-using HostCtl::Lib::RouteSettings;
-
 void NetworkInfoImpl::UpdateManagementInterface() {
     _mgmtName = GetBackend().GetManagementInterfaceName();
     _updated = true;
@@ -111,33 +108,74 @@ bool NetworkInfoImpl::IsQelIpv6Enabled() { return GetBackend().GetIpv6Enabled();
 
 void NetworkInfoImpl::SetQelIpv6Enabled(bool enabled) { GetBackend().SetIpv6Enabled(enabled); }
 
+namespace {
+
+bool IsValidLabel(const std::string& label) {
+    if (label.empty() || label.size() > 63 || label.front() == '-' || label.back() == '-') return false;
+    for (char c : label) {
+        const bool ok =
+            (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '-';
+        if (!ok) return false;
+    }
+    return true;
+}
+
+void CheckHostname(const std::string& name) {
+    if (!IsValidLabel(name))
+        throw HostCtlException("\"" + name +
+                               "\" is not a valid host name (letters, digits and '-', 1 to 63 characters, "
+                               "not beginning or ending with '-')");
+}
+
+}  // namespace
+
+bool DnsConfigImpl::IsValidDomainName(const std::string& name) {
+    if (name.empty() || name.size() > 253) return false;
+    size_t start = 0;
+    for (;;) {
+        const size_t dot = name.find('.', start);
+        if (!IsValidLabel(name.substr(start, dot == std::string::npos ? std::string::npos : dot - start)))
+            return false;
+        if (dot == std::string::npos) return true;
+        start = dot + 1;
+    }
+}
+
+std::vector<std::string> DnsConfigImpl::SplitSearchDomains(const std::string& domains) {
+    std::vector<std::string> pieces;
+    std::string piece;
+    for (char c : domains + " ") {
+        if (c == ' ' || c == ',' || c == '\t') {
+            if (!piece.empty()) pieces.push_back(piece);
+            piece.clear();
+        } else {
+            piece += c;
+        }
+    }
+    return pieces;
+}
+
 DnsConfigImpl::DnsConfigImpl(std::string netstack) : _netstack(std::move(netstack)) {}
 
 std::string DnsConfigImpl::GetHostname() { return GetBackend().GetDns(_netstack).hostname; }
 
 std::string DnsConfigImpl::GetDomain() { return GetBackend().GetDns(_netstack).domain; }
 
-void DnsConfigImpl::SetHostname(const std::string& name) {
-    DnsSettings dns;
-    dns.hostname = name;
-    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsHostname);
+void DnsConfigImpl::SetHostname(const std::string& name, bool persist) {
+    CheckHostname(name);
+    GetBackend().SetHostname(_netstack, name, persist);
 }
 
-void DnsConfigImpl::SetFqdn(const std::string& fqdn) {
+void DnsConfigImpl::SetFqdn(const std::string& fqdn, bool persist) {
     // The first label is the host name, the rest (possibly nothing) the domain.
-    DnsSettings dns;
-    size_t dot = fqdn.find('.');
-    dns.hostname = fqdn.substr(0, dot);
-    dns.domain = dot == std::string::npos ? "" : fqdn.substr(dot + 1);
-    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsHostname | HostCtl::Lib::DnsDomain);
-}
-
-bool DnsConfigImpl::GetUseDhcp() { return GetBackend().GetDns(_netstack).dhcp; }
-
-void DnsConfigImpl::SetUseDhcp(bool v) {
-    DnsSettings dns;
-    dns.dhcp = v;
-    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsDhcp);
+    const size_t dot = fqdn.find('.');
+    const std::string hostname = fqdn.substr(0, dot);
+    const std::string domain = dot == std::string::npos ? "" : fqdn.substr(dot + 1);
+    CheckHostname(hostname);
+    if (!domain.empty() && !IsValidDomainName(domain))
+        throw HostCtlException("\"" + fqdn + "\" is not a valid fully qualified name: \"" + domain +
+                               "\" is no domain name");
+    GetBackend().SetFqdn(_netstack, hostname, domain, persist);
 }
 
 std::vector<HostCtl::Network::Ipv4Address> DnsConfigImpl::GetNameServers() {
@@ -148,26 +186,26 @@ std::vector<HostCtl::Network::Ipv6Address> DnsConfigImpl::GetIpv6NameServers() {
     return GetBackend().GetDns(_netstack).ipv6Servers;
 }
 
-void DnsConfigImpl::SetNameServers(const std::vector<HostCtl::Network::IpAddress>& servers) {
-    DnsSettings dns;
-    for (const HostCtl::Network::IpAddress& server : servers) {
-        if (server.IsIpv6())
-            dns.ipv6Servers.push_back(server.V6());
-        else
-            dns.servers.push_back(server.V4());
-    }
-    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsServers);
+void DnsConfigImpl::RemoveNameServers() { GetBackend().RemoveNameServers(_netstack); }
+
+void DnsConfigImpl::AddNameServer(const HostCtl::Network::IpAddress& server) {
+    GetBackend().AddNameServer(_netstack, server);
 }
 
 std::vector<std::string> DnsConfigImpl::GetSearchDomains() {
     return GetBackend().GetDns(_netstack).searchDomains;
 }
 
-void DnsConfigImpl::SetSearchDomains(const std::vector<std::string>& domains) {
-    DnsSettings dns;
-    dns.searchDomains = domains;
-    GetBackend().SetDns(_netstack, dns, HostCtl::Lib::DnsSearchDomains);
+void DnsConfigImpl::SetSearchDomainsString(const std::string& domains) {
+    const std::vector<std::string> pieces = SplitSearchDomains(domains);
+    for (const std::string& piece : pieces) {
+        if (!IsValidDomainName(piece))
+            throw HostCtlException("\"" + piece + "\" is not a valid search domain");
+    }
+    GetBackend().SetSearchDomains(_netstack, pieces);
 }
+
+void DnsConfigImpl::SaveConfig() { GetBackend().SaveConfig(_netstack); }
 
 RoutingInfoImpl::RoutingInfoImpl(std::string netstack) : _netstack(std::move(netstack)) {}
 
@@ -175,10 +213,8 @@ HostCtl::Network::Ipv4Address RoutingInfoImpl::GetQelKernelDefaultGateway() {
     return GetBackend().GetRouting(_netstack).ipv4Gateway;
 }
 
-void RoutingInfoImpl::SetQelKernelDefaultGateway(const HostCtl::Network::Ipv4Address& gw) {
-    RouteSettings routes;
-    routes.ipv4Gateway = gw;
-    GetBackend().SetRouting(_netstack, routes, HostCtl::Lib::RouteIpv4Gateway);
+void RoutingInfoImpl::SetQelKernelDefaultGateway(const HostCtl::Network::Ipv4Address& gw, bool persist) {
+    GetBackend().SetDefaultGateway(_netstack, gw, persist);
 }
 
 HostCtl::Network::Ipv6Address RoutingInfoImpl::GetIpv6QelKernelDefaultGateway() {
@@ -186,13 +222,15 @@ HostCtl::Network::Ipv6Address RoutingInfoImpl::GetIpv6QelKernelDefaultGateway() 
 }
 
 void RoutingInfoImpl::SetIpv6QelKernelDefaultGateway(const HostCtl::Network::Ipv6Address& gw) {
-    RouteSettings routes;
-    routes.ipv6Gateway = gw;
-    GetBackend().SetRouting(_netstack, routes, HostCtl::Lib::RouteIpv6Gateway);
+    GetBackend().SetIpv6DefaultGateway(_netstack, gw);
 }
 
 std::vector<std::string> VirtualSwitchInfoImpl::GetVirtualSwitchNames() {
     return GetBackend().GetVirtualSwitchNames();
+}
+
+std::vector<std::string> DistributedSwitchInfoImpl::GetDistributedSwitchNames() {
+    return GetBackend().GetDistributedSwitchNames();
 }
 
 }  // namespace Network

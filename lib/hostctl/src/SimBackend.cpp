@@ -1,12 +1,17 @@
 // The backend of a simulated host: every operation reads or changes the
 // host's state file through SimState, so that all processes working on the
 // host see one state.
+#include <algorithm>
 #include <climits>
 #include <cstdint>
 #include <functional>
+#include <stdexcept>
 #include <utility>
 
+#include "SimNetworkModel.hpp"
 #include "hostctl/Backend.hpp"
+#include "hostctl/QelCtl.hpp"
+#include "hostctl/SimNetwork.hpp"
 #include "hostctl/SimState.hpp"
 
 namespace HostCtl::Lib {
@@ -21,6 +26,74 @@ using Network::Ipv6AddressType;
 using Network::Ipv6Network;
 
 const char* const DEFAULT_NETSTACK = "defaultTcpipStack";
+
+// The operations of the backend, in the order of the Backend interface: the
+// names "faults" in the state knows. Every operation below names itself in
+// its Reading or Writing call, which refuses a name missing here.
+const std::vector<std::string> OPERATIONS = {
+    "GetVersionRecord",
+    "GetHardwareVendor",
+    "GetHardwareProduct",
+    "GetCpuPackages",
+    "GetCpuModel",
+    "GetMemoryPageSize",
+    "GetMemoryTotalPages",
+    "GetPnics",
+    "GetManagementInterfaceName",
+    "GetVnicIpConfig",
+    "SetVnicIpConfig",
+    "GetVnicConnectionPoint",
+    "GetVnicMacAddress",
+    "SetVnicMacAddress",
+    "RenewVnicDhcpLease",
+    "SetVnicEnabled",
+    "GetIpv6Enabled",
+    "SetIpv6Enabled",
+    "GetConnectionPointSwitch",
+    "GetVirtualSwitchNames",
+    "GetVirtualSwitchUplinks",
+    "GetTeamingPolicy",
+    "GetMaxActiveUplinks",
+    "AddUplinkToTeamingPolicy",
+    "RemoveUplinkFromTeamingPolicy",
+    "GetPortGroupNames",
+    "GetPortGroupVlanId",
+    "SetPortGroupVlanId",
+    "GetDistributedSwitchNames",
+    "GetDvsUplinkPorts",
+    "RemoveDvsUplink",
+    "GetDns",
+    "SetHostname",
+    "SetFqdn",
+    "RemoveNameServers",
+    "AddNameServer",
+    "SetSearchDomains",
+    "SaveConfig",
+    "GetRouting",
+    "SetDefaultGateway",
+    "SetIpv6DefaultGateway",
+    "GetWelcomeMessage",
+    "GetSystemAlert",
+    "SetSystemAlert",
+    "GetBootOptions",
+    "GetKeyboardLayout",
+    "SetKeyboardLayout",
+    "GetKeyboardLayouts",
+    "LoadKeyboardMappings",
+    "FindAdvancedOption",
+    "SetAdvancedOption",
+    "HasUserOption",
+    "GetSmartCardSlots",
+    "GetSmartCardToken",
+    "HasRunningVirtualMachines",
+    "GetDriverVmState",
+    "GetDriverVmDevices",
+    "SetDriverVmOwned",
+};
+
+bool IsSimulatedOperation(const char* name) {
+    return std::find(OPERATIONS.begin(), OPERATIONS.end(), name) != OPERATIONS.end();
+}
 
 // A name as one step of a JSON pointer ("/UserVars/X" -> "~1UserVars~1X").
 std::string PointerStep(const std::string& name) {
@@ -45,18 +118,6 @@ std::string JsonProblem(const nlohmann::json::exception& e) {
 
 std::string At(const std::string& pointer, size_t index) { return pointer + "/" + std::to_string(index); }
 
-const char* Ipv6TypeName(Ipv6AddressType type) {
-    switch (type) {
-        case Ipv6AddressType::Dhcp:
-            return "dhcp";
-        case Ipv6AddressType::Autoconf:
-            return "autoconf";
-        case Ipv6AddressType::Static:
-            break;
-    }
-    return "static";
-}
-
 class SimulatedBackend : public Backend {
 public:
     explicit SimulatedBackend(const std::string& root) : _sim(root) {}
@@ -64,7 +125,7 @@ public:
     // Version and hardware.
 
     VersionRecord GetVersionRecord() override {
-        return Reading([&](const json& s) {
+        return Reading("GetVersionRecord", [&](const json& s) {
             VersionRecord record;
             record.product = _sim.String(s, "/version/product");
             record.version = _sim.String(s, "/version/version");
@@ -78,15 +139,17 @@ public:
     }
 
     std::string GetHardwareVendor() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/hardware/vendor"); });
+        return Reading("GetHardwareVendor",
+                       [&](const json& s) { return _sim.String(s, "/hardware/vendor"); });
     }
 
     std::string GetHardwareProduct() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/hardware/product"); });
+        return Reading("GetHardwareProduct",
+                       [&](const json& s) { return _sim.String(s, "/hardware/product"); });
     }
 
     unsigned GetCpuPackages() override {
-        return Reading([&](const json& s) {
+        return Reading("GetCpuPackages", [&](const json& s) {
             uint64_t packages = _sim.Unsigned(s, "/hardware/cpu/packages");
             if (packages > UINT_MAX) throw _sim.Error("field /hardware/cpu/packages is too large");
             return unsigned(packages);
@@ -94,21 +157,23 @@ public:
     }
 
     std::string GetCpuModel() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/hardware/cpu/model"); });
+        return Reading("GetCpuModel", [&](const json& s) { return _sim.String(s, "/hardware/cpu/model"); });
     }
 
     uint64_t GetMemoryPageSize() override {
-        return Reading([&](const json& s) { return _sim.Unsigned(s, "/hardware/memory/pageSize"); });
+        return Reading("GetMemoryPageSize",
+                       [&](const json& s) { return _sim.Unsigned(s, "/hardware/memory/pageSize"); });
     }
 
     uint64_t GetMemoryTotalPages() override {
-        return Reading([&](const json& s) { return _sim.Unsigned(s, "/hardware/memory/totalPages"); });
+        return Reading("GetMemoryTotalPages",
+                       [&](const json& s) { return _sim.Unsigned(s, "/hardware/memory/totalPages"); });
     }
 
-    // Network.
+    // Network: virtual NICs. The rules of the network are in SimNetwork.cpp.
 
     std::vector<Network::Pnic> GetPnics() override {
-        return Reading([&](const json& s) {
+        return Reading("GetPnics", [&](const json& s) {
             std::vector<Network::Pnic> pnics;
             const std::string list = "/network/pnics";
             for (size_t i = 0; i < _sim.Array(s, list).size(); ++i) {
@@ -123,6 +188,8 @@ public:
                     throw _sim.Error("field " + p + "/speedMbps is out of range");
                 pnic.speedMbps = int(speed);
                 pnic.description = _sim.String(s, p + "/description");
+                // NICs without a hardware label may leave the field out.
+                if (s.at(json::json_pointer(p)).contains("label")) pnic.label = _sim.String(s, p + "/label");
                 pnics.push_back(std::move(pnic));
             }
             return pnics;
@@ -130,19 +197,22 @@ public:
     }
 
     std::string GetManagementInterfaceName() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/network/managementInterface"); });
+        return Reading("GetManagementInterfaceName",
+                       [&](const json& s) { return _sim.String(s, "/network/managementInterface"); });
     }
 
     Network::IpConfig GetVnicIpConfig(const std::string& vnic) override {
-        return Reading([&](const json& s) {
-            const std::string p = VnicPointer(s, vnic);
+        return Reading("GetVnicIpConfig", [&](const json& s) {
+            const std::string p = NetworkView(_sim, s).VnicPointer(vnic);
             Network::IpConfig config;
-            config.SetUseDhcp(_sim.Bool(s, p + "/ipv4/dhcp"));
-            config.SetIpv4UseNone(_sim.Bool(s, p + "/ipv4/none"));
+            // IPv4 off wins over DHCP in a state that has both.
+            const bool none = _sim.Bool(s, p + "/ipv4/none");
+            config.SetUseDhcp(_sim.Bool(s, p + "/ipv4/dhcp") && !none, none);
             config.SetIpv4Address(V4(s, p + "/ipv4/address"));
             config.SetIpv4Netmask(V4(s, p + "/ipv4/netmask"));
-            config.SetIpv6Dhcp(_sim.Bool(s, p + "/ipv6/dhcp"));
-            config.SetIpv6RouterAdvertisement(_sim.Bool(s, p + "/ipv6/routerAdvertisement"));
+            config.SetUseIpv6Dhcp(_sim.Bool(s, p + "/ipv6/dhcp"));
+            config.SetUseIpv6RouterAdvertised(_sim.Bool(s, p + "/ipv6/routerAdvertisement"));
+            config.SetDhcpDns(_sim.Bool(s, p + "/dhcpDns"));
             std::vector<Ipv6Network> networks;
             const std::string list = p + "/ipv6/addresses";
             for (size_t i = 0; i < _sim.Array(s, list).size(); ++i) {
@@ -151,57 +221,192 @@ public:
                 if (prefix < 0 || prefix > 128) throw _sim.Error("field " + a + "/prefix must be 0 to 128");
                 networks.emplace_back(V6(s, a + "/address"), int(prefix), Ipv6Type(s, a + "/type"));
             }
+            // A kernel without IPv6 has no IPv6 address on any interface.
+            if (!_sim.Bool(s, "/network/ipv6Enabled")) networks.clear();
             config.SetIpv6Network(networks);
             return config;
         });
     }
 
     void SetVnicIpConfig(const std::string& vnic, const Network::IpConfig& config) override {
-        Writing([&](json& s) {
-            const std::string p = VnicPointer(s, vnic);
-            json& ipv4 = ObjectAt(s, p + "/ipv4");
-            ipv4["dhcp"] = config.GetUseDhcp();
-            ipv4["none"] = config.GetIpv4UseNone();
-            ipv4["address"] = config.GetIpv4Address().GetStringAddress();
-            ipv4["netmask"] = config.GetIpv4Netmask().GetStringAddress();
-            json& ipv6 = ObjectAt(s, p + "/ipv6");
-            ipv6["dhcp"] = config.GetIpv6Dhcp();
-            ipv6["routerAdvertisement"] = config.GetIpv6RouterAdvertisement();
-            json addresses = json::array();
-            for (const Ipv6Network& network : config.GetIpv6Network()) {
-                addresses.push_back({{"address", network.GetStringAddress()},
-                                     {"prefix", network.GetPrefixLength()},
-                                     {"type", Ipv6TypeName(network.GetIpv6AddressType())}});
-            }
-            ipv6["addresses"] = std::move(addresses);
-        });
+        Writing("SetVnicIpConfig",
+                [&](json& s) {
+                    NetworkModel network(_sim, s);
+                    network.SetIpConfig(network.VnicPointer(vnic), config);
+                },
+                {vnic});
     }
 
     Network::ConnectionPoint GetVnicConnectionPoint(const std::string& vnic) override {
-        return Reading([&](const json& s) {
-            const std::string p = VnicPointer(s, vnic);
-            int64_t type = _sim.Integer(s, p + "/connectionType");
-            if (type < 0 || type > 2) throw _sim.Error("field " + p + "/connectionType must be 0, 1 or 2");
-            return Network::ConnectionPoint(int(type), _sim.String(s, p + "/portgroup"));
+        return Reading("GetVnicConnectionPoint", [&](const json& s) {
+            const std::string p = NetworkView(_sim, s).VnicPointer(vnic);
+            const int64_t type = _sim.Integer(s, p + "/connectionType");
+            switch (type) {
+                case Network::ConnectionPoint::None:
+                    return Network::ConnectionPoint(int(type), "");
+                case Network::ConnectionPoint::PortGroup:
+                case Network::ConnectionPoint::OpaqueNetwork:
+                    return Network::ConnectionPoint(int(type), _sim.String(s, p + "/portgroup"));
+                case Network::ConnectionPoint::DvsPort:
+                    return Network::ConnectionPoint(int(type), _sim.String(s, p + "/port"));
+                default:
+                    throw _sim.Error("field " + p + "/connectionType must be 0, 1, 2 or 3");
+            }
         });
     }
 
-    bool GetIpv6Enabled() override {
-        return Reading([&](const json& s) { return _sim.Bool(s, "/network/ipv6Enabled"); });
+    std::string GetVnicMacAddress(const std::string& vnic) override {
+        return Reading("GetVnicMacAddress", [&](const json& s) {
+            return _sim.String(s, NetworkView(_sim, s).VnicPointer(vnic) + "/mac");
+        });
     }
 
-    void SetIpv6Enabled(bool enabled) override {
-        Writing([&](json& s) { ObjectAt(s, "/network")["ipv6Enabled"] = enabled; });
+    void SetVnicMacAddress(const std::string& vnic, const std::string& mac) override {
+        Writing("SetVnicMacAddress",
+                [&](json& s) {
+                    NetworkModel network(_sim, s);
+                    network.SetMac(network.VnicPointer(vnic), mac);
+                },
+                {vnic, mac});
     }
+
+    void RenewVnicDhcpLease(const std::string& vnic) override {
+        Writing("RenewVnicDhcpLease",
+                [&](json& s) {
+                    NetworkModel network(_sim, s);
+                    network.RenewLeases(network.VnicPointer(vnic));
+                },
+                {vnic});
+    }
+
+    void SetVnicEnabled(const std::string& vnic, bool enabled) override {
+        Writing("SetVnicEnabled",
+                [&](json& s) {
+                    NetworkModel network(_sim, s);
+                    network.SetEnabled(network.VnicPointer(vnic), enabled);
+                },
+                {vnic, enabled});
+    }
+
+    bool GetIpv6Enabled() override {
+        return Reading("GetIpv6Enabled", [&](const json& s) { return _sim.Bool(s, "/network/ipv6Enabled"); });
+    }
+
+    // The running kernel keeps its IPv6 setting until the host boots again.
+    void SetIpv6Enabled(bool enabled) override {
+        Writing("SetIpv6Enabled",
+                [&](json& s) {
+                    _sim.Bool(s, "/network/ipv6EnabledAtBoot");
+                    ObjectAt(s, "/network")["ipv6EnabledAtBoot"] = enabled;
+                },
+                {enabled});
+    }
+
+    // Switches.
+
+    std::string GetConnectionPointSwitch(const Network::ConnectionPoint& point) override {
+        return Reading("GetConnectionPointSwitch", [&](const json& s) {
+            return NetworkView(_sim, s).ConnectionPointSwitch(point.GetType(), point.GetName());
+        });
+    }
+
+    std::vector<std::string> GetVirtualSwitchNames() override {
+        return Reading("GetVirtualSwitchNames",
+                       [&](const json& s) { return Names(s, "/network/vswitches"); });
+    }
+
+    std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) override {
+        return Reading("GetVirtualSwitchUplinks", [&](const json& s) {
+            return _sim.StringList(s, NetworkView(_sim, s).VswitchPointer(vswitch) + "/uplinks");
+        });
+    }
+
+    Network::TeamingPolicy GetTeamingPolicy(const std::string& vswitch) override {
+        return Reading("GetTeamingPolicy", [&](const json& s) {
+            const std::string p = NetworkView(_sim, s).VswitchPointer(vswitch);
+            Network::TeamingPolicy policy;
+            policy.activeUplinks = _sim.StringList(s, p + "/teaming/active");
+            policy.standbyUplinks = _sim.StringList(s, p + "/teaming/standby");
+            return policy;
+        });
+    }
+
+    unsigned GetMaxActiveUplinks(const std::string& vswitch) override {
+        return Reading("GetMaxActiveUplinks", [&](const json& s) {
+            const std::string p = NetworkView(_sim, s).VswitchPointer(vswitch) + "/maxActiveUplinks";
+            const uint64_t most = _sim.Unsigned(s, p);
+            if (most > UINT_MAX) throw _sim.Error("field " + p + " is too large");
+            return unsigned(most);
+        });
+    }
+
+    void AddUplinkToTeamingPolicy(const std::string& vswitch, const std::string& pnic,
+                                  bool standby) override {
+        Writing("AddUplinkToTeamingPolicy",
+                [&](json& s) { NetworkModel(_sim, s).AddUplink(vswitch, pnic, standby); },
+                {vswitch, pnic, standby ? "standby" : "active"});
+    }
+
+    void RemoveUplinkFromTeamingPolicy(const std::string& vswitch, const std::string& pnic) override {
+        Writing("RemoveUplinkFromTeamingPolicy",
+                [&](json& s) { NetworkModel(_sim, s).RemoveUplink(vswitch, pnic); }, {vswitch, pnic});
+    }
+
+    std::vector<std::string> GetPortGroupNames(const std::string& vswitch) override {
+        return Reading("GetPortGroupNames", [&](const json& s) {
+            return Names(s, NetworkView(_sim, s).VswitchPointer(vswitch) + "/portgroups");
+        });
+    }
+
+    uint16_t GetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup) override {
+        return Reading("GetPortGroupVlanId", [&](const json& s) {
+            NetworkView network(_sim, s);
+            const std::string p =
+                network.PortGroupPointer(network.VswitchPointer(vswitch), portGroup) + "/vlan";
+            const uint64_t vlan = _sim.Unsigned(s, p);
+            if (vlan > 4095) throw _sim.Error("field " + p + " is above 4095");
+            return uint16_t(vlan);
+        });
+    }
+
+    void SetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup,
+                            uint16_t vlanId) override {
+        Writing("SetPortGroupVlanId",
+                [&](json& s) { NetworkModel(_sim, s).SetPortGroupVlan(vswitch, portGroup, vlanId); },
+                {vswitch, portGroup, vlanId});
+    }
+
+    std::vector<std::string> GetDistributedSwitchNames() override {
+        return Reading("GetDistributedSwitchNames",
+                       [&](const json& s) { return Names(s, "/network/dvswitches"); });
+    }
+
+    std::vector<Network::DistributedSwitch::UplinkPort> GetDvsUplinkPorts(const std::string& dvs) override {
+        return Reading("GetDvsUplinkPorts", [&](const json& s) {
+            const std::string list = NetworkView(_sim, s).DvsPointer(dvs) + "/uplinkPorts";
+            std::vector<Network::DistributedSwitch::UplinkPort> ports;
+            for (size_t i = 0; i < _sim.Array(s, list).size(); ++i)
+                ports.push_back(
+                    {_sim.String(s, At(list, i) + "/key"), _sim.String(s, At(list, i) + "/pnic")});
+            return ports;
+        });
+    }
+
+    void RemoveDvsUplink(const std::string& dvs, const std::string& pnic) override {
+        Writing("RemoveDvsUplink", [&](json& s) { NetworkModel(_sim, s).RemoveDvsUplink(dvs, pnic); },
+                {dvs, pnic});
+    }
+
+    // Name service and routing. The running configuration is "network/dns"
+    // and "network/routing"; "network/saved" is what the host boots with.
 
     DnsSettings GetDns(const std::string& netstack) override {
-        return Reading([&](const json& s) {
+        return Reading("GetDns", [&](const json& s) {
             CheckNetstack(netstack);
             const std::string p = "/network/dns";
             DnsSettings dns;
             dns.hostname = _sim.String(s, p + "/hostname");
             dns.domain = _sim.String(s, p + "/domain");
-            dns.dhcp = _sim.Bool(s, p + "/dhcp");
             for (size_t i = 0; i < _sim.Array(s, p + "/servers").size(); ++i)
                 dns.servers.push_back(V4(s, At(p + "/servers", i)));
             for (size_t i = 0; i < _sim.Array(s, p + "/ipv6Servers").size(); ++i)
@@ -211,27 +416,79 @@ public:
         });
     }
 
-    void SetDns(const std::string& netstack, const DnsSettings& settings, unsigned fields) override {
-        CheckNetstack(netstack);
-        Writing([&](json& s) {
+    void SetHostname(const std::string& netstack, const std::string& hostname, bool persist) override {
+        Writing("SetHostname",
+                [&](json& s) {
+                    CheckNetstack(netstack);
+                    CheckHostname(hostname);
+                    for (json* dns : DnsObjects(s, persist)) (*dns)["hostname"] = hostname;
+                },
+                {hostname, persist});
+    }
+
+    void SetFqdn(const std::string& netstack, const std::string& hostname, const std::string& domain,
+                 bool persist) override {
+        Writing("SetFqdn",
+                [&](json& s) {
+                    CheckNetstack(netstack);
+                    CheckHostname(hostname);
+                    if (!domain.empty() && !QelCtl::Network::DnsConfigImpl::IsValidDomainName(domain))
+                        throw HostCtlException("\"" + domain + "\" is not a valid domain name");
+                    for (json* dns : DnsObjects(s, persist)) {
+                        (*dns)["hostname"] = hostname;
+                        (*dns)["domain"] = domain;
+                    }
+                },
+                {hostname, domain, persist});
+    }
+
+    void RemoveNameServers(const std::string& netstack) override {
+        Writing("RemoveNameServers", [&](json& s) {
+            CheckNetstack(netstack);
             json& dns = ObjectAt(s, "/network/dns");
-            if (fields & DnsHostname) dns["hostname"] = settings.hostname;
-            if (fields & DnsDomain) dns["domain"] = settings.domain;
-            if (fields & DnsDhcp) dns["dhcp"] = settings.dhcp;
-            if (fields & DnsServers) {
-                json v4 = json::array();
-                for (const Ipv4Address& a : settings.servers) v4.push_back(a.GetStringAddress());
-                json v6 = json::array();
-                for (const Ipv6Address& a : settings.ipv6Servers) v6.push_back(a.GetStringAddress());
-                dns["servers"] = std::move(v4);
-                dns["ipv6Servers"] = std::move(v6);
-            }
-            if (fields & DnsSearchDomains) dns["searchDomains"] = settings.searchDomains;
+            dns["servers"] = json::array();
+            dns["ipv6Servers"] = json::array();
+        });
+    }
+
+    void AddNameServer(const std::string& netstack, const Network::IpAddress& server) override {
+        Writing("AddNameServer",
+                [&](json& s) {
+                    CheckNetstack(netstack);
+                    const std::string list =
+                        server.IsIpv6() ? "/network/dns/ipv6Servers" : "/network/dns/servers";
+                    const std::string text = server.GetStringAddress();
+                    for (const std::string& known : _sim.StringList(s, list))
+                        if (known == text) return;  // a server is listed once
+                    s.at(json::json_pointer(list)).push_back(text);
+                },
+                {server.GetStringAddress()});
+    }
+
+    void SetSearchDomains(const std::string& netstack, const std::vector<std::string>& domains) override {
+        Writing(
+            "SetSearchDomains",
+            [&](json& s) {
+                CheckNetstack(netstack);
+                for (const std::string& domain : domains)
+                    if (!QelCtl::Network::DnsConfigImpl::IsValidDomainName(domain))
+                        throw HostCtlException("\"" + domain + "\" is not a valid search domain");
+                ObjectAt(s, "/network/dns")["searchDomains"] = domains;
+            },
+            json(domains));
+    }
+
+    void SaveConfig(const std::string& netstack) override {
+        Writing("SaveConfig", [&](json& s) {
+            CheckNetstack(netstack);
+            json& saved = ObjectAt(s, "/network/saved");
+            saved["dns"] = _sim.Object(s, "/network/dns");
+            saved["routing"] = _sim.Object(s, "/network/routing");
         });
     }
 
     RouteSettings GetRouting(const std::string& netstack) override {
-        return Reading([&](const json& s) {
+        return Reading("GetRouting", [&](const json& s) {
             CheckNetstack(netstack);
             RouteSettings routes;
             routes.ipv4Gateway = V4(s, "/network/routing/ipv4Gateway");
@@ -240,41 +497,44 @@ public:
         });
     }
 
-    void SetRouting(const std::string& netstack, const RouteSettings& settings, unsigned fields) override {
-        CheckNetstack(netstack);
-        Writing([&](json& s) {
-            json& routing = ObjectAt(s, "/network/routing");
-            if (fields & RouteIpv4Gateway) routing["ipv4Gateway"] = settings.ipv4Gateway.GetStringAddress();
-            if (fields & RouteIpv6Gateway) routing["ipv6Gateway"] = settings.ipv6Gateway.GetStringAddress();
-        });
+    void SetDefaultGateway(const std::string& netstack, const Ipv4Address& gateway, bool persist) override {
+        Writing("SetDefaultGateway",
+                [&](json& s) {
+                    CheckNetstack(netstack);
+                    ObjectAt(s, "/network/routing")["ipv4Gateway"] = gateway.GetStringAddress();
+                    if (persist)
+                        ObjectAt(s, "/network/saved/routing")["ipv4Gateway"] = gateway.GetStringAddress();
+                },
+                {gateway.GetStringAddress(), persist});
     }
 
-    std::vector<std::string> GetVirtualSwitchNames() override {
-        return Reading([&](const json& s) {
-            std::vector<std::string> names;
-            const std::string list = "/network/vswitches";
-            for (size_t i = 0; i < _sim.Array(s, list).size(); ++i)
-                names.push_back(_sim.String(s, At(list, i) + "/name"));
-            return names;
-        });
+    void SetIpv6DefaultGateway(const std::string& netstack, const Ipv6Address& gateway) override {
+        Writing("SetIpv6DefaultGateway",
+                [&](json& s) {
+                    CheckNetstack(netstack);
+                    ObjectAt(s, "/network/routing")["ipv6Gateway"] = gateway.GetStringAddress();
+                },
+                {gateway.GetStringAddress()});
     }
 
     // System.
 
     std::string GetWelcomeMessage() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/system/welcomeMessage"); });
+        return Reading("GetWelcomeMessage",
+                       [&](const json& s) { return _sim.String(s, "/system/welcomeMessage"); });
     }
 
     std::string GetSystemAlert() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/system/systemAlert"); });
+        return Reading("GetSystemAlert",
+                       [&](const json& s) { return _sim.String(s, "/system/systemAlert"); });
     }
 
     void SetSystemAlert(const std::string& alert) override {
-        Writing([&](json& s) { ObjectAt(s, "/system")["systemAlert"] = alert; });
+        Writing("SetSystemAlert", [&](json& s) { ObjectAt(s, "/system")["systemAlert"] = alert; });
     }
 
     QelCtl::System::BootOptions GetBootOptions() override {
-        return Reading([&](const json& s) {
+        return Reading("GetBootOptions", [&](const json& s) {
             QelCtl::System::BootOptions options;
             options.auditMode = _sim.Bool(s, "/system/bootOptions/auditMode");
             return options;
@@ -282,11 +542,12 @@ public:
     }
 
     std::string GetKeyboardLayout() override {
-        return Reading([&](const json& s) { return _sim.String(s, "/system/keyboardLayout"); });
+        return Reading("GetKeyboardLayout",
+                       [&](const json& s) { return _sim.String(s, "/system/keyboardLayout"); });
     }
 
     void SetKeyboardLayout(const std::string& layout) override {
-        Writing([&](json& s) {
+        Writing("SetKeyboardLayout", [&](json& s) {
             bool known = false;
             for (const std::string& name : _sim.StringList(s, "/system/keyboardLayouts"))
                 known |= name == layout;
@@ -296,12 +557,13 @@ public:
     }
 
     std::vector<std::string> GetKeyboardLayouts() override {
-        return Reading([&](const json& s) { return _sim.StringList(s, "/system/keyboardLayouts"); });
+        return Reading("GetKeyboardLayouts",
+                       [&](const json& s) { return _sim.StringList(s, "/system/keyboardLayouts"); });
     }
 
     // The simulated console driver only remembers which mappings it holds.
     void LoadKeyboardMappings(const std::string& layout) override {
-        Writing([&](json& s) {
+        Writing("LoadKeyboardMappings", [&](json& s) {
             bool known = false;
             for (const std::string& name : _sim.StringList(s, "/system/keyboardLayouts"))
                 known |= name == layout;
@@ -313,14 +575,14 @@ public:
     // Options.
 
     std::optional<AdvancedOptionValue> FindAdvancedOption(const std::string& name) override {
-        return Reading([&](const json& s) -> std::optional<AdvancedOptionValue> {
+        return Reading("FindAdvancedOption", [&](const json& s) -> std::optional<AdvancedOptionValue> {
             if (!_sim.Object(s, "/advancedOptions").contains(name)) return std::nullopt;
             return OptionValue(s, name);
         });
     }
 
     void SetAdvancedOption(const std::string& name, const AdvancedOptionValue& value) override {
-        Writing([&](json& s) {
+        Writing("SetAdvancedOption", [&](json& s) {
             json& options = ObjectAt(s, "/advancedOptions");
             if (!options.contains(name)) throw _sim.Error("no advanced option \"" + name + "\"");
             if (OptionValue(s, name).isInteger != value.isInteger)
@@ -334,13 +596,14 @@ public:
     }
 
     bool HasUserOption(const std::string& name) override {
-        return Reading([&](const json& s) { return _sim.Object(s, "/userOptions").contains(name); });
+        return Reading("HasUserOption",
+                       [&](const json& s) { return _sim.Object(s, "/userOptions").contains(name); });
     }
 
     // Smart cards.
 
     std::vector<QelCtl::Hardware::SmartCardSlot> GetSmartCardSlots() override {
-        return Reading([&](const json& s) {
+        return Reading("GetSmartCardSlots", [&](const json& s) {
             std::vector<QelCtl::Hardware::SmartCardSlot> slots;
             const std::string list = "/smartCards/slots";
             for (size_t i = 0; i < _sim.Array(s, list).size(); ++i)
@@ -350,32 +613,34 @@ public:
     }
 
     std::optional<QelCtl::Hardware::SmartCardToken> GetSmartCardToken(const std::string& slot) override {
-        return Reading([&](const json& s) -> std::optional<QelCtl::Hardware::SmartCardToken> {
-            const std::string list = "/smartCards/slots";
-            for (size_t i = 0; i < _sim.Array(s, list).size(); ++i) {
-                const std::string p = At(list, i);
-                if (_sim.String(s, p + "/name") != slot) continue;
-                if (_sim.Field(s, p + "/token").is_null()) return std::nullopt;
-                _sim.Object(s, p + "/token");
-                QelCtl::Hardware::SmartCardToken token;
-                token.label = _sim.String(s, p + "/token/label");
-                token.userIds = _sim.StringList(s, p + "/token/userIds");
-                return token;
-            }
-            return std::nullopt;
-        });
+        return Reading("GetSmartCardToken",
+                       [&](const json& s) -> std::optional<QelCtl::Hardware::SmartCardToken> {
+                           const std::string list = "/smartCards/slots";
+                           for (size_t i = 0; i < _sim.Array(s, list).size(); ++i) {
+                               const std::string p = At(list, i);
+                               if (_sim.String(s, p + "/name") != slot) continue;
+                               if (_sim.Field(s, p + "/token").is_null()) return std::nullopt;
+                               _sim.Object(s, p + "/token");
+                               QelCtl::Hardware::SmartCardToken token;
+                               token.label = _sim.String(s, p + "/token/label");
+                               token.userIds = _sim.StringList(s, p + "/token/userIds");
+                               return token;
+                           }
+                           return std::nullopt;
+                       });
     }
 
     // Virtual machines.
 
     bool HasRunningVirtualMachines() override {
-        return Reading([&](const json& s) { return _sim.Unsigned(s, "/vms/running") > 0; });
+        return Reading("HasRunningVirtualMachines",
+                       [&](const json& s) { return _sim.Unsigned(s, "/vms/running") > 0; });
     }
 
     // Driver VM. A host without "/driverVm" has no driver VM and no devices.
 
     int GetDriverVmState() override {
-        return Reading([&](const json& s) {
+        return Reading("GetDriverVmState", [&](const json& s) {
             if (!s.contains("driverVm")) return 0;
             int64_t state = _sim.Integer(s, "/driverVm/state");
             if (state < 0 || state > 2) throw _sim.Error("field /driverVm/state must be 0, 1 or 2");
@@ -384,11 +649,11 @@ public:
     }
 
     std::vector<QelCtl::Hardware::DriverVmDevice> GetDriverVmDevices() override {
-        return Reading([&](const json& s) { return DriverVmDevices(s); });
+        return Reading("GetDriverVmDevices", [&](const json& s) { return DriverVmDevices(s); });
     }
 
     void SetDriverVmOwned(const std::vector<std::string>& ownedIds) override {
-        Writing([&](json& s) {
+        Writing("SetDriverVmOwned", [&](json& s) {
             std::vector<QelCtl::Hardware::DriverVmDevice> devices = DriverVmDevices(s);
             for (const std::string& id : ownedIds) {
                 bool known = false;
@@ -412,26 +677,86 @@ public:
     }
 
 private:
-    // Runs `read` on the latest state. Library errors that a state of an
-    // unexpected shape could still raise are turned into the state's errors.
+    // Runs `read` on the latest state, unless a fault is set for `operation`.
+    // Library errors that a state of an unexpected shape could still raise
+    // are turned into the state's errors.
     template <typename Read>
-    auto Reading(Read read) -> decltype(read(std::declval<const json&>())) {
+    auto Reading(const char* operation, Read read) -> decltype(read(std::declval<const json&>())) {
         std::shared_ptr<const json> state = _sim.Read();
         try {
+            CheckFault(*state, operation);
             return read(*state);
         } catch (const json::exception& e) {
             throw _sim.Error(JsonProblem(e));
         }
     }
 
-    // Applies `change` to the latest state under the lock; nothing is written
-    // when it throws.
-    void Writing(const std::function<void(json&)>& change) {
+    // Applies `change` to the latest state under the lock, unless a fault is
+    // set for `operation`; nothing is written when it throws. When the host
+    // name, the domain or the management address changed, the hosts file
+    // follows, still under the lock.
+    void Writing(const char* operation, const std::function<void(json&)>& change, json args = json::array()) {
+        std::string hostname, domain, entry;
         try {
-            _sim.Update(change);
+            _sim.Update(
+                [&](json& s) {
+                    CheckFault(s, operation);
+                    hostname = DnsText(s, "hostname");
+                    domain = DnsText(s, "domain");
+                    entry = HostsFileEntry(s);
+                    change(s);
+                    // The host's own record of what it was asked to change.
+                    _sim.AppendHistory(
+                        s, {{"tool", "hostctl"}, {"operation", operation}, {"args", std::move(args)}});
+                },
+                [&](const json& s) {
+                    if (DnsText(s, "hostname") == hostname && DnsText(s, "domain") == domain &&
+                        HostsFileEntry(s) == entry)
+                        return;
+                    SyncHostsFile(_sim.Root(), s, {hostname, domain.empty() ? "" : hostname + "." + domain});
+                });
         } catch (const json::exception& e) {
             throw _sim.Error(JsonProblem(e));
         }
+    }
+
+    void CheckFault(const json& s, const char* operation) const {
+        if (!IsSimulatedOperation(operation))
+            throw std::logic_error(std::string("unlisted operation ") + operation);
+        const auto faults = s.find("faults");
+        if (faults == s.end() || faults->is_null()) return;
+        if (!faults->is_object()) throw _sim.Error("field /faults must be an object");
+        const auto fault = faults->find(operation);
+        if (fault == faults->end()) return;
+        if (!fault->is_string())
+            throw _sim.Error(std::string("field /faults/") + operation + " must be a string");
+        throw HostCtlException(fault->get<std::string>());
+    }
+
+    static std::string DnsText(const json& s, const char* field) {
+        const json::json_pointer at("/network/dns/" + std::string(field));
+        return s.contains(at) && s.at(at).is_string() ? s.at(at).get<std::string>() : "";
+    }
+
+    static void CheckHostname(const std::string& hostname) {
+        if (hostname.find('.') != std::string::npos ||
+            !QelCtl::Network::DnsConfigImpl::IsValidDomainName(hostname))
+            throw HostCtlException("\"" + hostname + "\" is not a valid host name");
+    }
+
+    // The running DNS configuration, and the saved one too when `persist`.
+    std::vector<json*> DnsObjects(json& s, bool persist) {
+        std::vector<json*> objects = {&ObjectAt(s, "/network/dns")};
+        if (persist) objects.push_back(&ObjectAt(s, "/network/saved/dns"));
+        return objects;
+    }
+
+    // The "name" of every member of the list at `pointer`.
+    std::vector<std::string> Names(const json& s, const std::string& list) const {
+        std::vector<std::string> names;
+        for (size_t i = 0; i < _sim.Array(s, list).size(); ++i)
+            names.push_back(_sim.String(s, At(list, i) + "/name"));
+        return names;
     }
 
     void CheckNetstack(const std::string& netstack) const {
@@ -450,15 +775,6 @@ private:
         json& v = s.at(at);
         if (!v.is_object()) throw _sim.Error("field " + pointer + " must be an object");
         return v;
-    }
-
-    // The pointer of the virtual NIC with that name.
-    std::string VnicPointer(const json& s, const std::string& vnic) const {
-        const std::string list = "/network/vnics";
-        for (size_t i = 0; i < _sim.Array(s, list).size(); ++i) {
-            if (_sim.String(s, At(list, i) + "/name") == vnic) return At(list, i);
-        }
-        throw _sim.Error("no virtual NIC named \"" + vnic + "\"");
     }
 
     Ipv4Address V4(const json& s, const std::string& pointer) const {
@@ -522,5 +838,7 @@ private:
 std::unique_ptr<Backend> MakeSimulatedBackend(const std::string& root) {
     return std::make_unique<SimulatedBackend>(root);
 }
+
+const std::vector<std::string>& SimulatedOperations() { return OPERATIONS; }
 
 }  // namespace HostCtl::Lib

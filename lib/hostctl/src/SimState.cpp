@@ -10,6 +10,9 @@
 #include <climits>
 #include <system_error>
 
+#include "hostctl/Host.hpp"
+#include "hostctl/SimNetwork.hpp"
+
 namespace HostCtl::Lib {
 
 using nlohmann::json;
@@ -56,12 +59,48 @@ bool WriteAll(int fd, const std::string& data) {
 }
 
 // The default state, as a JSON text so that it reads like the state file.
-// Fields whose meaning the names do not tell: a virtual NIC's
-// "connectionType" is 0 (not connected), 1 (a standard-switch port group) or 2
-// (a distributed-switch port) and "portgroup" names what it is connected to;
-// an IPv6 address's "type" is "static", "dhcp" or "autoconf"; "network/dns" and
-// "network/routing" are those of the network stack "defaultTcpipStack"; a
-// smart-card slot's "token" is null when the slot is empty, else
+// Fields whose meaning the names do not tell:
+//
+// "network" (the network stack "defaultTcpipStack"; SimNetwork.cpp holds its
+// rules):
+// - "pnics": the physical NICs; "label" is the PCI device's hardware label
+//   ("" when it has none), "speedMbps" 0 while the link is down.
+// - "vnics": the host's virtual NICs. "mac" (the first virtual NIC takes the
+//   MAC of its switch's first uplink), "enabled" (up or down), "dhcpDns"
+//   (name servers and domain from DHCP). "connectionType" is 0 (not
+//   connected), 1 (a port group of a standard switch, named by "portgroup"),
+//   2 (port "port" of distributed switch "dvs") or 3 (an opaque network whose
+//   id is "portgroup"). "ipv4": "dhcp", "none" (IPv4 off; wins over "dhcp"),
+//   and the address and netmask it holds now (static, leased, or 0.0.0.0
+//   without an answer).
+//   "ipv6": the "dhcp" (DHCPv6) and "routerAdvertisement" switches, the
+//   configured "static" addresses ({"address", "prefix"}) and the
+//   "addresses" the interface holds now, each with a "type" of "static",
+//   "dhcp" or "autoconf" (link-local and router-advertised ones); none while
+//   the kernel has no IPv6.
+// - "vswitches": standard switches; "uplinks" are the attached NICs, the
+//   teaming policy's "active" and "standby" lists hold only attached ones, at
+//   most "maxActiveUplinks" active; port groups have a "vlan" (0 untagged,
+//   4095 all VLANs).
+// - "dvswitches": distributed switches the host is a member of: uplink ports
+//   ({"key", "pnic"}, "pnic" "" when no NIC backs the port) and ports
+//   ({"key", "vlan", "hostLocal", "connectee"}: the virtual NIC on the port,
+//   or "").
+// - "ipv6Enabled": IPv6 in the running kernel; "ipv6EnabledAtBoot": what the
+//   next boot gives it.
+// - "dns", "routing": the running name service and default gateways
+//   ("0.0.0.0" and "::" for none); "saved": {"dns", "routing"}, the
+//   configuration the host boots with.
+// - "lan": the physical network every uplink is cabled to, by VLAN id as
+//   text ("0" untagged). A VLAN may have a DHCP server "dhcp" (pool "first" to
+//   "last", "netmask", "gateway", "dns", "domain", and its "leases" by MAC), an
+//   IPv6 router "routerAdvertisement" ("prefix", "prefixLength", the "router"
+//   address) and a DHCPv6 server "dhcpv6" ("first", "last", "dns", "leases").
+//
+// "faults": {operation: message}: the simulated backend's operation of that
+// name (a Backend method name) fails with the message and changes nothing.
+//
+// Elsewhere: a smart-card slot's "token" is null when the slot is empty, else
 // {"label": text, "userIds": [text, ...]}; advanced options hold an integer or
 // a text; "userOptions" holds the names of the user options that are set.
 const char* const DEFAULT_STATE = R"({
@@ -75,21 +114,56 @@ const char* const DEFAULT_STATE = R"({
   },
   "network": {
     "ipv6Enabled": true,
+    "ipv6EnabledAtBoot": true,
     "managementInterface": "qk0",
+    "pnics": [
+      {"name": "zonic0", "mac": "00:50:56:01:00:02", "driver": "e1000e", "linkUp": true, "speedMbps": 1000,
+       "description": "Acme Gigabit Ethernet Controller", "label": "NIC 1"},
+      {"name": "zonic1", "mac": "00:50:56:01:00:03", "driver": "e1000e", "linkUp": true, "speedMbps": 1000,
+       "description": "Acme Gigabit Ethernet Controller", "label": "NIC 2"},
+      {"name": "zonic2", "mac": "00:50:56:01:00:04", "driver": "ixgben", "linkUp": true, "speedMbps": 10000,
+       "description": "Brightwave 10G Ethernet Adapter", "label": ""},
+      {"name": "zonic3", "mac": "00:50:56:01:00:05", "driver": "e1000e", "linkUp": false, "speedMbps": 0,
+       "description": "Acme Gigabit Ethernet Controller", "label": "Embedded LOM Port 4"}
+    ],
+    "vswitches": [
+      {"name": "kSwitch0", "uplinks": ["zonic0"], "maxActiveUplinks": 2,
+       "teaming": {"active": ["zonic0"], "standby": []},
+       "portgroups": [{"name": "Management Network", "vlan": 0}]},
+      {"name": "kSwitch1", "uplinks": ["zonic2"], "maxActiveUplinks": 2,
+       "teaming": {"active": ["zonic2"], "standby": []},
+       "portgroups": [{"name": "VM Network", "vlan": 0}]}
+    ],
+    "dvswitches": [],
     "vnics": [{
-      "name": "qk0", "portgroup": "Management Network", "connectionType": 1,
-      "ipv4": {"dhcp": true, "none": false, "address": "192.168.10.21", "netmask": "255.255.255.0"},
-      "ipv6": {"dhcp": false, "routerAdvertisement": true,
+      "name": "qk0", "mac": "00:50:56:01:00:02", "enabled": true, "dhcpDns": true,
+      "connectionType": 1, "portgroup": "Management Network",
+      "ipv4": {"dhcp": true, "none": false, "address": "192.0.2.100", "netmask": "255.255.255.0"},
+      "ipv6": {"dhcp": false, "routerAdvertisement": true, "static": [],
                "addresses": [{"address": "fe80::250:56ff:fe01:2", "prefix": 64, "type": "autoconf"}]}
     }],
-    "pnics": [{"name": "zonic0", "mac": "00:50:56:01:00:02", "driver": "e1000e", "linkUp": true,
-               "speedMbps": 1000, "description": "Acme Gigabit Ethernet Controller"}],
-    "dns": {"hostname": "host1", "domain": "example.test", "dhcp": true, "servers": ["192.168.10.1"],
-            "ipv6Servers": [], "searchDomains": ["example.test"]},
-    "routing": {"ipv4Gateway": "192.168.10.1", "ipv6Gateway": "::"},
-    "vswitches": [{"name": "kSwitch0", "uplinks": ["zonic0"],
-                   "portgroups": [{"name": "Management Network", "vlan": 0}]}]
+    "dns": {"hostname": "host1", "domain": "example.test", "servers": ["192.0.2.53"], "ipv6Servers": [],
+            "searchDomains": ["example.test"]},
+    "routing": {"ipv4Gateway": "192.0.2.1", "ipv6Gateway": "::"},
+    "saved": {
+      "dns": {"hostname": "host1", "domain": "example.test", "servers": [], "ipv6Servers": [],
+              "searchDomains": []},
+      "routing": {"ipv4Gateway": "0.0.0.0", "ipv6Gateway": "::"}
+    },
+    "lan": {
+      "0": {"dhcp": {"first": "192.0.2.100", "last": "192.0.2.199", "netmask": "255.255.255.0",
+                     "gateway": "192.0.2.1", "dns": ["192.0.2.53"], "domain": "example.test",
+                     "leases": {"00:50:56:01:00:02": "192.0.2.100"}}},
+      "20": {"dhcp": {"first": "198.51.100.100", "last": "198.51.100.199", "netmask": "255.255.255.0",
+                      "gateway": "198.51.100.1", "dns": ["198.51.100.53"], "domain": "example.test",
+                      "leases": {}},
+             "routerAdvertisement": {"prefix": "2001:db8:20::", "prefixLength": 64, "router": "fe80::1"},
+             "dhcpv6": {"first": "2001:db8:20::1000", "last": "2001:db8:20::10ff", "dns": ["2001:db8:20::53"],
+                        "leases": {}}},
+      "30": {}
+    }
   },
+  "faults": {},
   "system": {
     "welcomeMessage": "",
     "systemAlert": "",
@@ -187,7 +261,8 @@ std::shared_ptr<const json> SimState::Read() {
     return state;
 }
 
-void SimState::Update(const std::function<void(json&)>& change) {
+void SimState::Update(const std::function<void(json&)>& change,
+                      const std::function<void(const json&)>& afterWrite) {
     Fd lockFd(open(LockPath().c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0644));
     if (lockFd.get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
     while (flock(lockFd.get(), LOCK_EX) < 0) {
@@ -199,6 +274,7 @@ void SimState::Update(const std::function<void(json&)>& change) {
     json state = Load(identity, true);
     change(state);
     WriteLocked(state);
+    if (afterWrite) afterWrite(state);
 }
 
 void SimState::Replace(const json& state) {
@@ -253,6 +329,21 @@ void SimState::WriteLocked(const json& state) {
     std::lock_guard<std::mutex> lock(_mutex);
     _cached = std::make_shared<const json>(state);
     _cachedIdentity = {st.st_dev, st.st_ino, st.st_size, st.st_mtim};
+}
+
+void SimState::AppendHistory(json& state, json entry) const {
+    if (!state.contains("history")) state["history"] = json::array();
+    json& history = state["history"];
+    if (!history.is_array()) throw Error("field /history must be an array");
+    uint64_t last = 0;
+    for (const json& old : history) {
+        if (!old.is_object() || !old.contains("seq")) continue;
+        const json& seq = old["seq"];
+        if (seq.is_number_unsigned() && seq.get<uint64_t>() > last) last = seq.get<uint64_t>();
+    }
+    entry["seq"] = last + 1;
+    entry["time"] = UtcTimestamp();
+    history.push_back(std::move(entry));
 }
 
 const json& SimState::Field(const json& state, const std::string& pointer) const {
@@ -312,12 +403,17 @@ std::vector<std::string> SimState::StringList(const json& state, const std::stri
 json DefaultHostState(const std::string& hostname) {
     json state = json::parse(DEFAULT_STATE);
     size_t dot = hostname.find('.');
-    state["network"]["dns"]["hostname"] = hostname.substr(0, dot);
+    for (json* dns : {&state["network"]["dns"], &state["network"]["saved"]["dns"]})
+        (*dns)["hostname"] = hostname.substr(0, dot);
     if (dot != std::string::npos) {
+        // The host's domain is the one its network's DHCP servers hand out.
         std::string domain = hostname.substr(dot + 1);
-        state["network"]["dns"]["domain"] = domain;
-        state["network"]["dns"]["searchDomains"] = json::array({domain});
+        state["network"]["saved"]["dns"]["domain"] = domain;
+        for (auto& [vlan, servers] : state["network"]["lan"].items())
+            if (servers.contains("dhcp")) servers["dhcp"]["domain"] = domain;
     }
+    // What the host obtains from its network is derived as a boot derives it.
+    BootNetwork(SimState("."), state);
     return state;
 }
 

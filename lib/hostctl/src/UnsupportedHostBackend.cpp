@@ -33,17 +33,79 @@ public:
     Network::ConnectionPoint GetVnicConnectionPoint(const std::string&) override {
         Unavailable("reading a connection point");
     }
+    std::string GetVnicMacAddress(const std::string&) override {
+        Unavailable("reading a virtual NIC's MAC address");
+    }
+    void SetVnicMacAddress(const std::string&, const std::string&) override {
+        Unavailable("setting a virtual NIC's MAC address");
+    }
+    void RenewVnicDhcpLease(const std::string&) override { Unavailable("renewing a DHCP lease"); }
+    void SetVnicEnabled(const std::string&, bool enabled) override {
+        Unavailable(enabled ? "enabling a virtual NIC" : "disabling a virtual NIC");
+    }
     bool GetIpv6Enabled() override { Unavailable("reading the IPv6 setting"); }
     void SetIpv6Enabled(bool) override { Unavailable("setting IPv6"); }
-    DnsSettings GetDns(const std::string&) override { Unavailable("reading the DNS configuration"); }
-    void SetDns(const std::string&, const DnsSettings&, unsigned) override {
-        Unavailable("setting the DNS configuration");
-    }
-    RouteSettings GetRouting(const std::string&) override { Unavailable("reading the default gateways"); }
-    void SetRouting(const std::string&, const RouteSettings&, unsigned) override {
-        Unavailable("setting the default gateways");
+
+    std::string GetConnectionPointSwitch(const Network::ConnectionPoint&) override {
+        Unavailable("finding the switch of a connection point");
     }
     std::vector<std::string> GetVirtualSwitchNames() override { Unavailable("listing the virtual switches"); }
+    std::vector<std::string> GetVirtualSwitchUplinks(const std::string&) override {
+        Unavailable("listing a virtual switch's uplinks");
+    }
+    Network::TeamingPolicy GetTeamingPolicy(const std::string&) override {
+        Unavailable("reading a teaming policy");
+    }
+    unsigned GetMaxActiveUplinks(const std::string&) override {
+        Unavailable("reading the number of active uplinks allowed");
+    }
+    void AddUplinkToTeamingPolicy(const std::string&, const std::string&, bool) override {
+        Unavailable("adding an uplink to a teaming policy");
+    }
+    void RemoveUplinkFromTeamingPolicy(const std::string&, const std::string&) override {
+        Unavailable("removing an uplink from a teaming policy");
+    }
+    std::vector<std::string> GetPortGroupNames(const std::string&) override {
+        Unavailable("listing the port groups");
+    }
+    uint16_t GetPortGroupVlanId(const std::string&, const std::string&) override {
+        Unavailable("reading a port group's VLAN ID");
+    }
+    void SetPortGroupVlanId(const std::string&, const std::string&, uint16_t) override {
+        Unavailable("setting a port group's VLAN ID");
+    }
+    std::vector<std::string> GetDistributedSwitchNames() override {
+        Unavailable("listing the distributed switches");
+    }
+    std::vector<Network::DistributedSwitch::UplinkPort> GetDvsUplinkPorts(const std::string&) override {
+        Unavailable("listing a distributed switch's uplink ports");
+    }
+    void RemoveDvsUplink(const std::string&, const std::string&) override {
+        Unavailable("removing an uplink from a distributed switch");
+    }
+
+    DnsSettings GetDns(const std::string&) override { Unavailable("reading the DNS configuration"); }
+    void SetHostname(const std::string&, const std::string&, bool) override {
+        Unavailable("setting the host name");
+    }
+    void SetFqdn(const std::string&, const std::string&, const std::string&, bool) override {
+        Unavailable("setting the fully qualified host name");
+    }
+    void RemoveNameServers(const std::string&) override { Unavailable("removing the DNS servers"); }
+    void AddNameServer(const std::string&, const Network::IpAddress&) override {
+        Unavailable("adding a DNS server");
+    }
+    void SetSearchDomains(const std::string&, const std::vector<std::string>&) override {
+        Unavailable("setting the DNS search domains");
+    }
+    void SaveConfig(const std::string&) override { Unavailable("saving the network configuration"); }
+    RouteSettings GetRouting(const std::string&) override { Unavailable("reading the default gateways"); }
+    void SetDefaultGateway(const std::string&, const Network::Ipv4Address&, bool) override {
+        Unavailable("setting the IPv4 default gateway");
+    }
+    void SetIpv6DefaultGateway(const std::string&, const Network::Ipv6Address&) override {
+        Unavailable("setting the IPv6 default gateway");
+    }
 
     std::string GetWelcomeMessage() override { Unavailable("reading the welcome message"); }
     std::string GetSystemAlert() override { Unavailable("reading the system alert"); }

@@ -3,6 +3,7 @@
 #include <cstring>
 
 #include "TestSupport.hpp"
+#include "UnsupportedHostBackend.hpp"
 #include "hostctl/Backend.hpp"
 #include "hostctl/QelCtl.hpp"
 
@@ -75,12 +76,11 @@ TEST_F(SimBackendTest, VersionRecordNeedsAWholeBuffer) {
 
 TEST_F(SimBackendTest, IpConfigRoundTrip) {
     HostCtl::Network::IpConfig config;
-    config.SetUseDhcp(false);
-    config.SetIpv4UseNone(false);
-    config.SetIpv4Address(Ipv4Address("10.1.2.3"));
-    config.SetIpv4Netmask(Ipv4Address("255.255.252.0"));
-    config.SetIpv6Dhcp(true);
-    config.SetIpv6RouterAdvertisement(false);
+    config.SetUseDhcp(false, false, Ipv4Address("10.1.2.3"), Ipv4Address("255.255.252.0"));
+    config.SetUseIpv6Dhcp(true);
+    config.SetUseIpv6RouterAdvertised(false);
+    config.SetDhcpDns(false);
+    // Only the static entries are configuration; the others are obtained.
     config.SetIpv6Network({Ipv6Network(Ipv6Address("2001:db8::10"), 64, Ipv6AddressType::Static),
                            Ipv6Network(Ipv6Address("2001:db8:1::5"), 128, Ipv6AddressType::Dhcp),
                            Ipv6Network(Ipv6Address("fe80::1"), 10, Ipv6AddressType::Autoconf)});
@@ -93,31 +93,40 @@ TEST_F(SimBackendTest, IpConfigRoundTrip) {
     EXPECT_FALSE(read.GetIpv4UseNone());
     EXPECT_EQ(read.GetIpv4Address().GetStringAddress(), "10.1.2.3");
     EXPECT_EQ(read.GetIpv4Netmask().GetStringAddress(), "255.255.252.0");
-    EXPECT_TRUE(read.GetIpv6Dhcp());
-    EXPECT_FALSE(read.GetIpv6RouterAdvertisement());
-    ASSERT_EQ(read.GetIpv6Network().size(), 3u);
-    for (size_t i = 0; i < 3; ++i) {
-        EXPECT_EQ(read.GetIpv6Network()[i].ToString(), config.GetIpv6Network()[i].ToString());
-        EXPECT_EQ(read.GetIpv6Network()[i].GetIpv6AddressType(),
-                  config.GetIpv6Network()[i].GetIpv6AddressType());
-    }
+    EXPECT_TRUE(read.GetUseIpv6Dhcp());
+    EXPECT_FALSE(read.GetUseIpv6RouterAdvertised());
+    EXPECT_FALSE(read.GetDhcpDns());
+    ASSERT_EQ(read.GetIpv6Network().size(), 2u);
+    EXPECT_EQ(read.GetIpv6Network()[0].ToString(), "fe80::250:56ff:fe01:2/64");
+    EXPECT_EQ(read.GetIpv6Network()[0].GetIpv6AddressType(), Ipv6AddressType::Autoconf);
+    EXPECT_EQ(read.GetIpv6Network()[1].ToString(), "2001:db8::10/64");
+    EXPECT_EQ(read.GetIpv6Network()[1].GetIpv6AddressType(), Ipv6AddressType::Static);
     // What the write did not cover stays.
     EXPECT_EQ(State()["network"]["vnics"][0]["portgroup"], "Management Network");
     HostCtl::Network::ConnectionPoint point = HostCtl::Network::QelNic("qk0").GetConnectionPoint();
     EXPECT_EQ(point.GetType(), HostCtl::Network::ConnectionPoint::PortGroup);
     EXPECT_EQ(point.GetName(), "Management Network");
     EXPECT_THROW(HostCtl::Network::QelNic("qk7").SetIpConfig(config), HostCtlException);
+
+    // IPv4 off leaves the interface without an IPv4 address.
+    config.SetIpv4UseNone();
+    HostCtl::Network::QelNic("qk0").SetIpConfig(config);
+    read = HostCtl::Network::QelNic("qk0").GetIpConfig();
+    EXPECT_TRUE(read.GetIpv4UseNone());
+    EXPECT_FALSE(read.GetUseDhcp());
+    EXPECT_TRUE(read.GetIpv4Address().IsZero());
+    EXPECT_TRUE(read.GetIpv4Netmask().IsZero());
 }
 
 TEST_F(SimBackendTest, DnsWritesChangeOnlyTheirFields) {
     QelCtl::Network::DnsConfigImpl dns("defaultTcpipStack");
-    dns.SetFqdn("esx1.lab.test");
-    dns.SetNameServers({IpAddress("10.0.0.53"), IpAddress("2001:DB8::53"), IpAddress("10.0.0.54")});
-    dns.SetSearchDomains({"lab.test", "corp.test"});
-    dns.SetUseDhcp(false);
+    dns.SetFqdn("esx1.lab.test", false);
+    dns.RemoveNameServers();
+    for (const char* server : {"10.0.0.53", "2001:DB8::53", "10.0.0.54"})
+        dns.AddNameServer(IpAddress(server));
+    dns.SetSearchDomainsString("lab.test, corp.test");
     EXPECT_EQ(dns.GetHostname(), "esx1");
     EXPECT_EQ(dns.GetDomain(), "lab.test");
-    EXPECT_FALSE(dns.GetUseDhcp());
     ASSERT_EQ(dns.GetNameServers().size(), 2u);
     EXPECT_EQ(dns.GetNameServers()[0].GetStringAddress(), "10.0.0.53");
     EXPECT_EQ(dns.GetNameServers()[1].GetStringAddress(), "10.0.0.54");
@@ -125,28 +134,28 @@ TEST_F(SimBackendTest, DnsWritesChangeOnlyTheirFields) {
     EXPECT_EQ(dns.GetIpv6NameServers()[0].GetStringAddress(), "2001:db8::53");
     EXPECT_EQ(dns.GetSearchDomains(), (std::vector<std::string>{"lab.test", "corp.test"}));
 
-    dns.SetHostname("esx2");
+    dns.SetHostname("esx2", false);
     EXPECT_EQ(dns.GetHostname(), "esx2");
     EXPECT_EQ(dns.GetDomain(), "lab.test");
     EXPECT_EQ(dns.GetNameServers().size(), 2u);
-    dns.SetFqdn("solo");
+    dns.SetFqdn("solo", false);
     EXPECT_EQ(dns.GetHostname(), "solo");
     EXPECT_EQ(dns.GetDomain(), "");
-    dns.SetNameServers({});
+    dns.RemoveNameServers();
     EXPECT_TRUE(dns.GetNameServers().empty());
     EXPECT_TRUE(dns.GetIpv6NameServers().empty());
     EXPECT_EQ(dns.GetSearchDomains().size(), 2u);
 
     EXPECT_THROW(QelCtl::Network::DnsConfigImpl("otherStack").GetHostname(), HostCtlException);
-    EXPECT_THROW(QelCtl::Network::DnsConfigImpl("otherStack").SetHostname("x"), HostCtlException);
+    EXPECT_THROW(QelCtl::Network::DnsConfigImpl("otherStack").SetHostname("x", false), HostCtlException);
     EXPECT_EQ(dns.GetHostname(), "solo");
 }
 
 TEST_F(SimBackendTest, GatewaysAreSetOneAtATime) {
     QelCtl::Network::RoutingInfoImpl routing("defaultTcpipStack");
     routing.SetIpv6QelKernelDefaultGateway(Ipv6Address("2001:db8::1"));
-    EXPECT_EQ(routing.GetQelKernelDefaultGateway().GetStringAddress(), "192.168.10.1");
-    routing.SetQelKernelDefaultGateway(Ipv4Address("10.0.0.1"));
+    EXPECT_EQ(routing.GetQelKernelDefaultGateway().GetStringAddress(), "192.0.2.1");
+    routing.SetQelKernelDefaultGateway(Ipv4Address("10.0.0.1"), false);
     EXPECT_EQ(routing.GetQelKernelDefaultGateway().GetStringAddress(), "10.0.0.1");
     EXPECT_EQ(routing.GetIpv6QelKernelDefaultGateway().GetStringAddress(), "2001:db8::1");
     EXPECT_EQ(State()["network"]["routing"]["ipv6Gateway"], "2001:db8::1");
@@ -226,7 +235,7 @@ TEST_F(SimBackendTest, EveryCallReadsTheHostAgain) {
     QelCtl::Network::NetworkInfoImpl network;
     QelCtl::System::SystemInfoImpl system;
     QelCtl::Resource::ResourceInfoImpl resources;
-    EXPECT_EQ(network.GetPnics().size(), 1u);
+    EXPECT_EQ(network.GetPnics().size(), 4u);
     EXPECT_TRUE(network.IsQelIpv6Enabled());
     EXPECT_FALSE(resources.HasRunningVirtualMachines());
     EXPECT_EQ(system.GetWelcomeMessage(), "");
@@ -246,7 +255,7 @@ TEST_F(SimBackendTest, EveryCallReadsTheHostAgain) {
 
     network.SetQelIpv6Enabled(true);
     system.SetSystemAlert("disk failing");
-    EXPECT_EQ(State()["network"]["ipv6Enabled"], true);
+    EXPECT_EQ(State()["network"]["ipv6EnabledAtBoot"], true);
     EXPECT_EQ(State()["system"]["systemAlert"], "disk failing");
 }
 
@@ -299,6 +308,193 @@ TEST_F(DriverVmTest, OwnershipRoundTripKeepsGroupsTogether) {
     EXPECT_THROW(info.GetState(), HostCtlException);
     Edit([](json& s) { s["driverVm"]["state"] = 2; });
     EXPECT_EQ(info.GetState(), 2);
+}
+
+}  // namespace
+
+namespace {
+
+using HostCtl::Lib::Backend;
+using HostCtl::Lib::HostCtlException;
+using nlohmann::json;
+
+class FaultTest : public HostCtlTest::SimHostTest {
+protected:
+    // The default host with a distributed switch, where every operation of
+    // the table below succeeds.
+    void Reset() {
+        json state = HostCtl::Lib::DefaultHostState();
+        state["network"]["dvswitches"] = json::array(
+            {{{"name", "kDS-1"},
+              {"uplinkPorts", {{{"key", "uplink1"}, {"pnic", "zonic3"}}}},
+              {"ports", {{{"key", "100"}, {"vlan", 0}, {"hostLocal", false}, {"connectee", ""}}}}}});
+        HostCtl::Lib::SimState(Root()).Replace(state);
+        std::filesystem::create_directories(Root() + "/etc");
+        HostCtlTest::WriteFile(Root() + "/etc/hosts", "192.0.2.100\thost1.example.test host1\n");
+    }
+};
+
+TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
+    const std::string stack = "defaultTcpipStack";
+    using Call = std::function<void(Backend&)>;
+    HostCtl::Network::IpConfig dhcp;
+    dhcp.SetUseDhcp(true);
+    const std::vector<std::pair<std::string, Call>> calls = {
+        {"GetVersionRecord", [](Backend& b) { b.GetVersionRecord(); }},
+        {"GetHardwareVendor", [](Backend& b) { b.GetHardwareVendor(); }},
+        {"GetHardwareProduct", [](Backend& b) { b.GetHardwareProduct(); }},
+        {"GetCpuPackages", [](Backend& b) { b.GetCpuPackages(); }},
+        {"GetCpuModel", [](Backend& b) { b.GetCpuModel(); }},
+        {"GetMemoryPageSize", [](Backend& b) { b.GetMemoryPageSize(); }},
+        {"GetMemoryTotalPages", [](Backend& b) { b.GetMemoryTotalPages(); }},
+        {"GetPnics", [](Backend& b) { b.GetPnics(); }},
+        {"GetManagementInterfaceName", [](Backend& b) { b.GetManagementInterfaceName(); }},
+        {"GetVnicIpConfig", [](Backend& b) { b.GetVnicIpConfig("qk0"); }},
+        {"SetVnicIpConfig", [&](Backend& b) { b.SetVnicIpConfig("qk0", dhcp); }},
+        {"GetVnicConnectionPoint", [](Backend& b) { b.GetVnicConnectionPoint("qk0"); }},
+        {"GetVnicMacAddress", [](Backend& b) { b.GetVnicMacAddress("qk0"); }},
+        {"SetVnicMacAddress", [](Backend& b) { b.SetVnicMacAddress("qk0", "00:50:56:01:00:09"); }},
+        {"RenewVnicDhcpLease", [](Backend& b) { b.RenewVnicDhcpLease("qk0"); }},
+        {"SetVnicEnabled", [](Backend& b) { b.SetVnicEnabled("qk0", false); }},
+        {"GetIpv6Enabled", [](Backend& b) { b.GetIpv6Enabled(); }},
+        {"SetIpv6Enabled", [](Backend& b) { b.SetIpv6Enabled(false); }},
+        {"GetConnectionPointSwitch",
+         [](Backend& b) {
+             b.GetConnectionPointSwitch(HostCtl::Network::ConnectionPoint(1, "Management Network"));
+         }},
+        {"GetVirtualSwitchNames", [](Backend& b) { b.GetVirtualSwitchNames(); }},
+        {"GetVirtualSwitchUplinks", [](Backend& b) { b.GetVirtualSwitchUplinks("kSwitch0"); }},
+        {"GetTeamingPolicy", [](Backend& b) { b.GetTeamingPolicy("kSwitch0"); }},
+        {"GetMaxActiveUplinks", [](Backend& b) { b.GetMaxActiveUplinks("kSwitch0"); }},
+        {"AddUplinkToTeamingPolicy",
+         [](Backend& b) { b.AddUplinkToTeamingPolicy("kSwitch0", "zonic1", true); }},
+        {"RemoveUplinkFromTeamingPolicy",
+         [](Backend& b) { b.RemoveUplinkFromTeamingPolicy("kSwitch1", "zonic2"); }},
+        {"GetPortGroupNames", [](Backend& b) { b.GetPortGroupNames("kSwitch0"); }},
+        {"GetPortGroupVlanId", [](Backend& b) { b.GetPortGroupVlanId("kSwitch0", "Management Network"); }},
+        {"SetPortGroupVlanId",
+         [](Backend& b) { b.SetPortGroupVlanId("kSwitch0", "Management Network", 20); }},
+        {"GetDistributedSwitchNames", [](Backend& b) { b.GetDistributedSwitchNames(); }},
+        {"GetDvsUplinkPorts", [](Backend& b) { b.GetDvsUplinkPorts("kDS-1"); }},
+        {"RemoveDvsUplink", [](Backend& b) { b.RemoveDvsUplink("kDS-1", "zonic3"); }},
+        {"GetDns", [&](Backend& b) { b.GetDns(stack); }},
+        {"SetHostname", [&](Backend& b) { b.SetHostname(stack, "esx7", true); }},
+        {"SetFqdn", [&](Backend& b) { b.SetFqdn(stack, "esx7", "lab.test", true); }},
+        {"RemoveNameServers", [&](Backend& b) { b.RemoveNameServers(stack); }},
+        {"AddNameServer",
+         [&](Backend& b) { b.AddNameServer(stack, HostCtl::Network::IpAddress("192.0.2.54")); }},
+        {"SetSearchDomains", [&](Backend& b) { b.SetSearchDomains(stack, {"lab.test"}); }},
+        {"SaveConfig", [&](Backend& b) { b.SaveConfig(stack); }},
+        {"GetRouting", [&](Backend& b) { b.GetRouting(stack); }},
+        {"SetDefaultGateway",
+         [&](Backend& b) { b.SetDefaultGateway(stack, HostCtl::Network::Ipv4Address("192.0.2.254"), true); }},
+        {"SetIpv6DefaultGateway",
+         [&](Backend& b) { b.SetIpv6DefaultGateway(stack, HostCtl::Network::Ipv6Address("2001:db8::1")); }},
+        {"GetWelcomeMessage", [](Backend& b) { b.GetWelcomeMessage(); }},
+        {"GetSystemAlert", [](Backend& b) { b.GetSystemAlert(); }},
+        {"SetSystemAlert", [](Backend& b) { b.SetSystemAlert("disk failing"); }},
+        {"GetBootOptions", [](Backend& b) { b.GetBootOptions(); }},
+        {"GetKeyboardLayout", [](Backend& b) { b.GetKeyboardLayout(); }},
+        {"SetKeyboardLayout", [](Backend& b) { b.SetKeyboardLayout("German"); }},
+        {"GetKeyboardLayouts", [](Backend& b) { b.GetKeyboardLayouts(); }},
+        {"LoadKeyboardMappings", [](Backend& b) { b.LoadKeyboardMappings("German"); }},
+        {"FindAdvancedOption", [](Backend& b) { b.FindAdvancedOption("/UserVars/VelkTimeOut"); }},
+        {"SetAdvancedOption",
+         [](Backend& b) {
+             b.SetAdvancedOption("/UserVars/VelkTimeOut", {true, 30, ""});
+         }},
+        {"HasUserOption", [](Backend& b) { b.HasUserOption("PXEBootEnabled"); }},
+        {"GetSmartCardSlots", [](Backend& b) { b.GetSmartCardSlots(); }},
+        {"GetSmartCardToken", [](Backend& b) { b.GetSmartCardToken("slot0"); }},
+        {"HasRunningVirtualMachines", [](Backend& b) { b.HasRunningVirtualMachines(); }},
+        {"GetDriverVmState", [](Backend& b) { b.GetDriverVmState(); }},
+        {"GetDriverVmDevices", [](Backend& b) { b.GetDriverVmDevices(); }},
+        {"SetDriverVmOwned", [](Backend& b) { b.SetDriverVmOwned({}); }},
+    };
+    // The table covers every operation the backend lists, in its order.
+    std::vector<std::string> names;
+    for (const auto& [name, call] : calls) names.push_back(name);
+    EXPECT_EQ(names, HostCtl::Lib::SimulatedOperations());
+
+    Backend& backend = HostCtl::Lib::GetBackend();
+    for (const auto& [name, call] : calls) {
+        SCOPED_TRACE(name);
+        Reset();
+        const std::string message = "injected failure of " + name;
+        Edit([&](json& s) { s["faults"][name] = message; });
+        const std::string state = HostCtlTest::ReadFile(StatePath());
+        const std::string hosts = HostCtlTest::ReadFile(Root() + "/etc/hosts");
+        try {
+            call(backend);
+            ADD_FAILURE() << "no failure";
+        } catch (const HostCtlException& e) {
+            EXPECT_EQ(std::string(e.what()), message);
+        }
+        EXPECT_EQ(HostCtlTest::ReadFile(StatePath()), state);
+        EXPECT_EQ(HostCtlTest::ReadFile(Root() + "/etc/hosts"), hosts);
+
+        // Another operation's fault does not touch this one.
+        Edit([&](json& s) { s["faults"] = {{name == "GetPnics" ? "GetDns" : "GetPnics", "elsewhere"}}; });
+        EXPECT_NO_THROW(call(backend));
+    }
+
+    Reset();
+    Edit([](json& s) { s["faults"] = "GetPnics"; });
+    EXPECT_THROW(backend.GetPnics(), HostCtlException);
+}
+
+// The real machine's backend refuses every operation with a text that names it.
+TEST(UnsupportedHostBackendTest, RefusesTheNetworkOperationsByName) {
+    std::unique_ptr<Backend> backend = HostCtl::Lib::MakeUnsupportedHostBackend();
+    const std::string stack = "defaultTcpipStack";
+    const std::vector<std::pair<const char*, std::function<void(Backend&)>>> calls = {
+        {"renewing a DHCP lease", [](Backend& b) { b.RenewVnicDhcpLease("qk0"); }},
+        {"setting a virtual NIC's MAC address",
+         [](Backend& b) { b.SetVnicMacAddress("qk0", "00:50:56:01:00:09"); }},
+        {"reading a virtual NIC's MAC address", [](Backend& b) { b.GetVnicMacAddress("qk0"); }},
+        {"disabling a virtual NIC", [](Backend& b) { b.SetVnicEnabled("qk0", false); }},
+        {"enabling a virtual NIC", [](Backend& b) { b.SetVnicEnabled("qk0", true); }},
+        {"finding the switch of a connection point",
+         [](Backend& b) { b.GetConnectionPointSwitch(HostCtl::Network::ConnectionPoint(1, "x")); }},
+        {"listing a virtual switch's uplinks", [](Backend& b) { b.GetVirtualSwitchUplinks("kSwitch0"); }},
+        {"reading a teaming policy", [](Backend& b) { b.GetTeamingPolicy("kSwitch0"); }},
+        {"reading the number of active uplinks allowed",
+         [](Backend& b) { b.GetMaxActiveUplinks("kSwitch0"); }},
+        {"adding an uplink to a teaming policy",
+         [](Backend& b) { b.AddUplinkToTeamingPolicy("kSwitch0", "zonic1", false); }},
+        {"removing an uplink from a teaming policy",
+         [](Backend& b) { b.RemoveUplinkFromTeamingPolicy("kSwitch0", "zonic1"); }},
+        {"listing the port groups", [](Backend& b) { b.GetPortGroupNames("kSwitch0"); }},
+        {"reading a port group's VLAN ID", [](Backend& b) { b.GetPortGroupVlanId("kSwitch0", "x"); }},
+        {"setting a port group's VLAN ID", [](Backend& b) { b.SetPortGroupVlanId("kSwitch0", "x", 5); }},
+        {"listing the distributed switches", [](Backend& b) { b.GetDistributedSwitchNames(); }},
+        {"listing a distributed switch's uplink ports", [](Backend& b) { b.GetDvsUplinkPorts("kDS-1"); }},
+        {"removing an uplink from a distributed switch",
+         [](Backend& b) { b.RemoveDvsUplink("kDS-1", "zonic0"); }},
+        {"setting the host name", [&](Backend& b) { b.SetHostname(stack, "esx1", true); }},
+        {"setting the fully qualified host name",
+         [&](Backend& b) { b.SetFqdn(stack, "esx1", "lab.test", true); }},
+        {"removing the DNS servers", [&](Backend& b) { b.RemoveNameServers(stack); }},
+        {"adding a DNS server",
+         [&](Backend& b) { b.AddNameServer(stack, HostCtl::Network::IpAddress("::1")); }},
+        {"setting the DNS search domains", [&](Backend& b) { b.SetSearchDomains(stack, {}); }},
+        {"saving the network configuration", [&](Backend& b) { b.SaveConfig(stack); }},
+        {"setting the IPv4 default gateway",
+         [&](Backend& b) { b.SetDefaultGateway(stack, HostCtl::Network::Ipv4Address(), true); }},
+        {"setting the IPv6 default gateway",
+         [&](Backend& b) { b.SetIpv6DefaultGateway(stack, HostCtl::Network::Ipv6Address()); }},
+    };
+    for (const auto& [operation, call] : calls) {
+        SCOPED_TRACE(operation);
+        try {
+            call(*backend);
+            ADD_FAILURE() << "no failure";
+        } catch (const HostCtlException& e) {
+            EXPECT_EQ(std::string(e.what()).rfind(std::string(operation) + ": not available on this host", 0),
+                      0u)
+                << e.what();
+        }
+    }
 }
 
 }  // namespace

@@ -207,8 +207,9 @@ TEST_F(WrongFieldTest, OperationsNameTheFileAndTheField) {
          "field /network/vnics/0/ipv6/addresses/0/prefix must be 0 to 128"},
         {"/network/vnics/0/ipv4", json::array(),
          [] {
-             QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->SetIpConfig(
-                 HostCtl::Network::IpConfig());
+             HostCtl::Network::IpConfig dhcp;
+             dhcp.SetUseDhcp(true);
+             QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->SetIpConfig(dhcp);
          },
          "field /network/vnics/0/ipv4 must be an object"},
         {"/network/pnics/0/speedMbps", 1.5, [] { QelCtl::Network::NetworkInfoImpl().GetPnics(); },

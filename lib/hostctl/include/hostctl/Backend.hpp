@@ -28,31 +28,15 @@ struct VersionRecord {
 struct DnsSettings {
     std::string hostname;
     std::string domain;
-    bool dhcp = false;
     std::vector<Network::Ipv4Address> servers;
     std::vector<Network::Ipv6Address> ipv6Servers;
     std::vector<std::string> searchDomains;
-};
-
-// Which fields of DnsSettings a write changes; the others keep the host's
-// value, so that writers of different fields never undo each other.
-enum DnsField : unsigned {
-    DnsHostname = 1u << 0,
-    DnsDomain = 1u << 1,
-    DnsDhcp = 1u << 2,
-    DnsServers = 1u << 3,  // both the IPv4 and the IPv6 list
-    DnsSearchDomains = 1u << 4,
 };
 
 // Default gateways of one network stack ("0.0.0.0" / "::" for none).
 struct RouteSettings {
     Network::Ipv4Address ipv4Gateway;
     Network::Ipv6Address ipv6Gateway;
-};
-
-enum RouteField : unsigned {
-    RouteIpv4Gateway = 1u << 0,
-    RouteIpv6Gateway = 1u << 1,
 };
 
 // The value of an advanced option: an integer or a string.
@@ -75,22 +59,57 @@ public:
     virtual uint64_t GetMemoryPageSize() = 0;
     virtual uint64_t GetMemoryTotalPages() = 0;
 
-    // Network.
+    // Network: physical NICs and virtual NICs. A virtual NIC is named by
+    // its name ("qk0").
     virtual std::vector<Network::Pnic> GetPnics() = 0;
     // Name of the virtual NIC that carries management, or "" when none does.
     virtual std::string GetManagementInterfaceName() = 0;
     virtual Network::IpConfig GetVnicIpConfig(const std::string& vnic) = 0;
+    // Configures the interface: static addresses as given, DHCP leases and
+    // autoconfigured IPv6 addresses obtained as the configuration asks.
     virtual void SetVnicIpConfig(const std::string& vnic, const Network::IpConfig& config) = 0;
     virtual Network::ConnectionPoint GetVnicConnectionPoint(const std::string& vnic) = 0;
+    virtual std::string GetVnicMacAddress(const std::string& vnic) = 0;
+    virtual void SetVnicMacAddress(const std::string& vnic, const std::string& mac) = 0;
+    virtual void RenewVnicDhcpLease(const std::string& vnic) = 0;
+    // Down (dynamic addresses given up) or up (obtained anew).
+    virtual void SetVnicEnabled(const std::string& vnic, bool enabled) = 0;
+    // IPv6 in the running kernel; the setter decides the next boot.
     virtual bool GetIpv6Enabled() = 0;
     virtual void SetIpv6Enabled(bool enabled) = 0;
-    virtual DnsSettings GetDns(const std::string& netstack) = 0;
-    // Writes the fields named in `fields` (a DnsField mask).
-    virtual void SetDns(const std::string& netstack, const DnsSettings& settings, unsigned fields) = 0;
-    virtual RouteSettings GetRouting(const std::string& netstack) = 0;
-    // Writes the fields named in `fields` (a RouteField mask).
-    virtual void SetRouting(const std::string& netstack, const RouteSettings& settings, unsigned fields) = 0;
+
+    // Switches.
+    virtual std::string GetConnectionPointSwitch(const Network::ConnectionPoint& point) = 0;
     virtual std::vector<std::string> GetVirtualSwitchNames() = 0;
+    virtual std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) = 0;
+    virtual Network::TeamingPolicy GetTeamingPolicy(const std::string& vswitch) = 0;
+    virtual unsigned GetMaxActiveUplinks(const std::string& vswitch) = 0;
+    virtual void AddUplinkToTeamingPolicy(const std::string& vswitch, const std::string& pnic,
+                                          bool standby) = 0;
+    virtual void RemoveUplinkFromTeamingPolicy(const std::string& vswitch, const std::string& pnic) = 0;
+    virtual std::vector<std::string> GetPortGroupNames(const std::string& vswitch) = 0;
+    virtual uint16_t GetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup) = 0;
+    virtual void SetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup,
+                                    uint16_t vlanId) = 0;
+    virtual std::vector<std::string> GetDistributedSwitchNames() = 0;
+    virtual std::vector<Network::DistributedSwitch::UplinkPort> GetDvsUplinkPorts(const std::string& dvs) = 0;
+    virtual void RemoveDvsUplink(const std::string& dvs, const std::string& pnic) = 0;
+
+    // Name service and routing of a network stack ("defaultTcpipStack").
+    // `persist` also writes the saved configuration the host boots with.
+    virtual DnsSettings GetDns(const std::string& netstack) = 0;
+    virtual void SetHostname(const std::string& netstack, const std::string& hostname, bool persist) = 0;
+    // Host name and domain together (the domain may be empty).
+    virtual void SetFqdn(const std::string& netstack, const std::string& hostname, const std::string& domain,
+                         bool persist) = 0;
+    virtual void RemoveNameServers(const std::string& netstack) = 0;
+    virtual void AddNameServer(const std::string& netstack, const Network::IpAddress& server) = 0;
+    virtual void SetSearchDomains(const std::string& netstack, const std::vector<std::string>& domains) = 0;
+    virtual void SaveConfig(const std::string& netstack) = 0;
+    virtual RouteSettings GetRouting(const std::string& netstack) = 0;
+    virtual void SetDefaultGateway(const std::string& netstack, const Network::Ipv4Address& gateway,
+                                   bool persist) = 0;
+    virtual void SetIpv6DefaultGateway(const std::string& netstack, const Network::Ipv6Address& gateway) = 0;
 
     // System.
     virtual std::string GetWelcomeMessage() = 0;

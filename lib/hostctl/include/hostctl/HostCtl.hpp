@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 namespace HostCtl {
@@ -29,6 +30,11 @@ public:
     static bool IsValidAddress(const std::string& text);
     std::string GetStringAddress() const;
     uint32_t GetHostOrder() const { return _addr; }
+    static Ipv4Address FromHostOrder(uint32_t addr) {
+        Ipv4Address a;
+        a._addr = addr;
+        return a;
+    }
     bool IsZero() const { return _addr == 0; }
     // True for a netmask: ones from the top, then only zeros (0.0.0.0 and
     // 255.255.255.255 included).
@@ -63,6 +69,7 @@ public:
     std::string GetStringAddress() const;
     const Ipv4Address& V4() const { return _v4; }
     const Ipv6Address& V6() const { return _v6; }
+    bool operator==(const IpAddress&) const = default;
 
 private:
     bool _isV6 = false;
@@ -85,6 +92,7 @@ public:
     int GetPrefixLength() const { return _prefix; }
     Ipv6AddressType GetIpv6AddressType() const { return _type; }
     std::string ToString() const;  // "addr/prefix"
+    bool operator==(const Ipv6Network&) const = default;
 
 private:
     Ipv6Address _addr;
@@ -92,23 +100,46 @@ private:
     Ipv6AddressType _type = Ipv6AddressType::Static;
 };
 
-// The IP configuration of a virtual NIC.
+// The IP configuration of a virtual NIC: a value, read from the interface
+// and written back to it as a whole (QelNic::SetIpConfig).
 class IpConfig {
 public:
     bool GetUseDhcp() const { return _useDhcp; }
-    void SetUseDhcp(bool v) { _useDhcp = v; }
+    // How the interface gets its IPv4 address: from a DHCP server (useDhcp),
+    // not at all (none), or statically (neither: the address and netmask held
+    // here).
+    void SetUseDhcp(bool useDhcp, bool none = false) {
+        _useDhcp = useDhcp;
+        _ipv4None = none && !useDhcp;
+    }
+    // A static address and netmask in one step. Throws HostCtlException when
+    // they are no usable host address: an invalid or empty netmask, the
+    // unspecified, loopback, multicast, reserved or broadcast address, or the
+    // network or broadcast address of its own subnet (prefixes below 31).
+    void SetUseDhcp(bool useDhcp, bool none, const Ipv4Address& address, const Ipv4Address& netmask);
     bool GetIpv4UseNone() const { return _ipv4None; }
-    void SetIpv4UseNone(bool v) { _ipv4None = v; }
+    // IPv4 off: no DHCP, no address.
+    void SetIpv4UseNone() { SetUseDhcp(false, true); }
     const Ipv4Address& GetIpv4Address() const { return _ipv4; }
     void SetIpv4Address(const Ipv4Address& a) { _ipv4 = a; }
     const Ipv4Address& GetIpv4Netmask() const { return _netmask; }
     void SetIpv4Netmask(const Ipv4Address& m) { _netmask = m; }
+
+    // Every IPv6 address of the interface, each with the way it was obtained.
+    // When written, only the static ones are taken; the interface obtains the
+    // others itself (link-local, router advertisement, DHCPv6).
     const std::vector<Ipv6Network>& GetIpv6Network() const { return _ipv6; }
     void SetIpv6Network(const std::vector<Ipv6Network>& v) { _ipv6 = v; }
-    bool GetIpv6Dhcp() const { return _ipv6Dhcp; }
-    void SetIpv6Dhcp(bool v) { _ipv6Dhcp = v; }
-    bool GetIpv6RouterAdvertisement() const { return _ipv6Ra; }
-    void SetIpv6RouterAdvertisement(bool v) { _ipv6Ra = v; }
+    bool GetUseIpv6Dhcp() const { return _ipv6Dhcp; }
+    void SetUseIpv6Dhcp(bool v) { _ipv6Dhcp = v; }
+    bool GetUseIpv6RouterAdvertised() const { return _ipv6Ra; }
+    void SetUseIpv6RouterAdvertised(bool v) { _ipv6Ra = v; }
+
+    // Whether DNS servers and the domain come from the DHCP server.
+    bool GetDhcpDns() const { return _dhcpDns; }
+    void SetDhcpDns(bool v) { _dhcpDns = v; }
+
+    bool operator==(const IpConfig&) const = default;
 
 private:
     bool _useDhcp = false;
@@ -118,16 +149,24 @@ private:
     std::vector<Ipv6Network> _ipv6;
     bool _ipv6Dhcp = false;
     bool _ipv6Ra = false;
+    bool _dhcpDns = false;
 };
 
-// Where a virtual NIC is connected. Type 1 is a standard switch port
-// group, type 2 a distributed-switch port.
+// Where a virtual NIC is connected: a port group of a standard switch (type
+// 1), a port of a distributed switch (type 2) or an opaque network (type 3,
+// managed outside the host).
 class ConnectionPoint {
 public:
-    enum Type { None = 0, PortGroup = 1, DvsPort = 2 };
+    enum Type { None = 0, PortGroup = 1, DvsPort = 2, OpaqueNetwork = 3 };
     ConnectionPoint(int type, std::string name) : _type(type), _name(std::move(name)) {}
     int GetType() const { return _type; }
+    // The port group's name, the distributed port's key or the opaque
+    // network's id.
     const std::string& GetName() const { return _name; }
+    // The switch the point belongs to: the standard switch that holds the port
+    // group, or the distributed switch of the port. Asks the host; throws
+    // HostCtlException when no switch holds it.
+    std::string GetSwitchName() const;
 
 private:
     int _type;
@@ -142,6 +181,7 @@ struct Pnic {
     bool linkUp = true;
     int speedMbps = 1000;
     std::string description;
+    std::string label;  // the PCI device's hardware label ("NIC 1"); may be empty
 };
 
 // A virtual NIC of the host kernel (the management interface is one).
@@ -151,8 +191,73 @@ public:
     explicit QelNic(std::string name) : _name(std::move(name)) {}
     const std::string& GetName() const { return _name; }
     IpConfig GetIpConfig() const;
+    // Configures the interface as `cfg` says: static addresses are set, a
+    // DHCP lease and autoconfigured IPv6 addresses are obtained as asked.
     void SetIpConfig(const IpConfig& cfg);
     ConnectionPoint GetConnectionPoint() const;
+    std::string GetMacAddress() const;
+    void SetMacAddress(const std::string& mac);
+    // Asks the DHCP servers (DHCPv4 and, when used, DHCPv6) for a lease again.
+    void RenewDhcpLease();
+    // Takes the interface down: its dynamic addresses are given up.
+    void Disable();
+    // Brings it up again: leases and autoconfigured addresses are obtained anew.
+    void Enable();
+    // Disable, then Enable.
+    void Restart();
+
+private:
+    std::string _name;
+};
+
+// The uplinks a standard switch uses, in team order: active ones first,
+// then standby ones.
+struct TeamingPolicy {
+    std::vector<std::string> activeUplinks;
+    std::vector<std::string> standbyUplinks;
+};
+
+// A standard virtual switch of the host, by name; every call asks the host.
+class VirtualSwitch {
+public:
+    explicit VirtualSwitch(std::string name) : _name(std::move(name)) {}
+    const std::string& GetName() const { return _name; }
+    // The physical NICs attached to the switch.
+    std::vector<std::string> GetUplinks() const;
+    TeamingPolicy GetTeamingPolicy() const;
+    // How many uplinks the teaming policy may hold as active.
+    unsigned GetMaxActiveUplinks() const;
+    // Attaches the NIC to the switch and appends it to the active or standby
+    // uplinks. A NIC attached to another switch is refused.
+    void AddUplinkToTeamingPolicy(const std::string& pnic, bool standby);
+    // Takes the NIC out of the teaming policy and off the switch.
+    void RemoveUplinkFromTeamingPolicy(const std::string& pnic);
+    std::vector<std::string> GetPortGroupNames() const;
+    // 0 when the port group has no VLAN, 4095 for all VLANs.
+    uint16_t GetPortGroupVlanId(const std::string& portGroup) const;
+    void SetPortGroupVlanId(const std::string& portGroup, uint16_t vlanId);
+
+private:
+    std::string _name;
+};
+
+// A distributed switch the host is a member of.
+class DistributedSwitch {
+public:
+    // An uplink port of the switch on this host and the NIC that backs it
+    // ("" when none does).
+    struct UplinkPort {
+        std::string key;
+        std::string pnic;
+    };
+
+    explicit DistributedSwitch(std::string name) : _name(std::move(name)) {}
+    const std::string& GetName() const { return _name; }
+    std::vector<UplinkPort> GetUplinkPorts() const;
+    // The host's NICs that back uplink ports of the switch.
+    std::vector<std::string> GetUsedUplinks() const;
+    // Frees the uplink port the NIC backs.
+    void RemoveUplink(const std::string& pnic);
 
 private:
     std::string _name;

@@ -114,7 +114,9 @@ public:
     // The management interface found by the last update, or null.
     std::unique_ptr<HostCtl::Network::QelNic> GetManagementInterface();
     std::vector<HostCtl::Network::Pnic> GetPnics();
+    // Whether the running kernel has IPv6.
     bool IsQelIpv6Enabled();
+    // Turns IPv6 on or off for the next boot of the host.
     void SetQelIpv6Enabled(bool enabled);
 
 private:
@@ -122,20 +124,39 @@ private:
     std::string _mgmtName;
 };
 
+// Host name, domain, name servers and search domains of one network stack.
+// Setters with a `persist` flag change the running configuration and, when
+// the flag is set, the saved one too; SaveConfig saves all of it. What is not
+// saved is lost when the host boots.
 class DnsConfigImpl {
 public:
     explicit DnsConfigImpl(std::string netstack);
     std::string GetHostname();
     std::string GetDomain();
-    void SetHostname(const std::string& name);
-    void SetFqdn(const std::string& fqdn);
-    bool GetUseDhcp();
-    void SetUseDhcp(bool v);
+    // A host name without a domain; the domain stays. Throws HostCtlException
+    // for a name that is not a valid host name.
+    void SetHostname(const std::string& name, bool persist);
+    // A fully qualified name: the first label becomes the host name, the rest
+    // the domain.
+    void SetFqdn(const std::string& fqdn, bool persist);
     std::vector<HostCtl::Network::Ipv4Address> GetNameServers();
     std::vector<HostCtl::Network::Ipv6Address> GetIpv6NameServers();
-    void SetNameServers(const std::vector<HostCtl::Network::IpAddress>& servers);
+    void RemoveNameServers();
+    // Appends a server to the list (IPv4 or IPv6).
+    void AddNameServer(const HostCtl::Network::IpAddress& server);
     std::vector<std::string> GetSearchDomains();
-    void SetSearchDomains(const std::vector<std::string>& domains);
+    // The search domains as one text, separated by blanks or commas; empty
+    // pieces are dropped. Throws HostCtlException for a piece that is not a
+    // valid domain name.
+    void SetSearchDomainsString(const std::string& domains);
+    // Makes the running configuration the one the host boots with.
+    void SaveConfig();
+
+    // The pieces of a search-domain text (blanks and commas separate them).
+    static std::vector<std::string> SplitSearchDomains(const std::string& domains);
+    // Letters, digits and '-' in labels of 1 to 63 characters, no label
+    // beginning or ending with '-'; dots between labels; 253 characters at most.
+    static bool IsValidDomainName(const std::string& name);
 
 private:
     std::string _netstack;
@@ -145,8 +166,10 @@ class RoutingInfoImpl {
 public:
     explicit RoutingInfoImpl(std::string netstack);
     HostCtl::Network::Ipv4Address GetQelKernelDefaultGateway();
-    void SetQelKernelDefaultGateway(const HostCtl::Network::Ipv4Address& gw);
+    // 0.0.0.0 removes the default route.
+    void SetQelKernelDefaultGateway(const HostCtl::Network::Ipv4Address& gw, bool persist);
     HostCtl::Network::Ipv6Address GetIpv6QelKernelDefaultGateway();
+    // :: removes the default route.
     void SetIpv6QelKernelDefaultGateway(const HostCtl::Network::Ipv6Address& gw);
 
 private:
@@ -157,6 +180,12 @@ class VirtualSwitchInfoImpl {
 public:
     // Names of the host's standard virtual switches.
     std::vector<std::string> GetVirtualSwitchNames();
+};
+
+class DistributedSwitchInfoImpl {
+public:
+    // Names of the distributed switches the host is a member of.
+    std::vector<std::string> GetDistributedSwitchNames();
 };
 
 }  // namespace Network

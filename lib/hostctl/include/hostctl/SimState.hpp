@@ -20,6 +20,7 @@
 #include <mutex>
 #include <nlohmann/json.hpp>
 #include <string>
+#include <vector>
 
 #include "hostctl/HostCtl.hpp"
 
@@ -40,8 +41,13 @@ public:
     std::shared_ptr<const nlohmann::json> Read();
 
     // Applies `change` to the latest state and writes the result, all under
-    // the lock. When `change` throws, nothing is written.
-    void Update(const std::function<void(nlohmann::json&)>& change);
+    // the lock. When `change` throws, nothing is written. `afterWrite`, when
+    // given, runs with the state as written while the lock is still held (for
+    // files that must follow the state in the same order as the state's
+    // writes); an exception from it reaches the caller, the state stays
+    // written.
+    void Update(const std::function<void(nlohmann::json&)>& change,
+                const std::function<void(const nlohmann::json&)>& afterWrite = nullptr);
 
     // Writes `state` as the whole new state, under the lock; the file need not
     // exist yet.
@@ -58,6 +64,12 @@ public:
     const nlohmann::json& Array(const nlohmann::json& state, const std::string& pointer) const;
     const nlohmann::json& Object(const nlohmann::json& state, const std::string& pointer) const;
     std::vector<std::string> StringList(const nlohmann::json& state, const std::string& pointer) const;
+
+    // Appends `entry` to the state's "/history" (created when missing), giving
+    // it the time and a "seq" one above the highest seq already recorded, so
+    // that the order of entries can be checked even after the list was
+    // edited. Call it inside Update: only there is the state the latest.
+    void AppendHistory(nlohmann::json& state, nlohmann::json entry) const;
 
     // An exception whose text is "<state file>: <problem>".
     HostCtlException Error(const std::string& problem) const;
@@ -90,7 +102,15 @@ private:
 // holds a dot ("esx1.lab.test") also sets the domain.
 nlohmann::json DefaultHostState(const std::string& hostname = "host1");
 
-// A backend working on the simulated host in `root`.
+// A backend working on the simulated host in `root`. Before anything else,
+// each of its operations looks for its own name (the Backend method name,
+// "SetVnicIpConfig") in the state's "faults" object; when it is there, the
+// operation throws HostCtlException with the text stored under the name and
+// changes nothing.
 std::unique_ptr<Backend> MakeSimulatedBackend(const std::string& root);
+
+// The names of the simulated backend's operations, the names "faults" knows,
+// in the order of the Backend interface.
+const std::vector<std::string>& SimulatedOperations();
 
 }  // namespace HostCtl::Lib

@@ -1,0 +1,101 @@
+// The rules of the simulated host's network, applied to a state held in
+// memory. The simulated backend runs them inside its locked updates; booting
+// and creating a host run the same code, so every state they leave is one the
+// rules could have produced.
+#pragma once
+
+#include <nlohmann/json.hpp>
+#include <string>
+#include <vector>
+
+#include "hostctl/HostCtl.hpp"
+#include "hostctl/SimState.hpp"
+
+namespace HostCtl::Lib {
+
+// Questions about the network part of a state. Lookups by name answer JSON
+// pointers into the state and throw HostCtlException when nothing has the
+// name; fields of the wrong shape throw errors naming the state file and the
+// field.
+class NetworkView {
+public:
+    NetworkView(const SimState& sim, const nlohmann::json& state) : _sim(sim), _view(state) {}
+
+    std::string VnicPointer(const std::string& vnic) const;
+    std::string PnicPointer(const std::string& pnic) const;
+    std::string VswitchPointer(const std::string& vswitch) const;
+    std::string PortGroupPointer(const std::string& vswitchPointer, const std::string& portGroup) const;
+    std::string DvsPointer(const std::string& dvs) const;
+
+    // The switch that holds a connection point (ConnectionPoint::Type and its
+    // name); throws when none does or the type has no switch on the host.
+    std::string ConnectionPointSwitch(int type, const std::string& name) const;
+    // The standard or distributed switch the NIC is attached to, or "".
+    std::string SwitchOfPnic(const std::string& pnic) const;
+
+    // Whether the virtual NIC is enabled and its switch has a teaming uplink
+    // (or a distributed uplink port) whose NIC has link.
+    bool HasLink(const std::string& vnicPointer) const;
+    // The VLAN of the virtual NIC's port group or distributed port, or -1
+    // when it is connected to neither.
+    int Vlan(const std::string& vnicPointer) const;
+
+protected:
+    // The pointer of the member of `list` whose "name" (or `key`) is `name`,
+    // or "" when none is.
+    std::string Find(const std::string& list, const std::string& name, const char* key = "name") const;
+    bool PnicHasLink(const std::string& pnic) const;
+
+    const SimState& _sim;
+    const nlohmann::json& _view;
+};
+
+// The network's changes. Each leaves the state as the host would be after it:
+// addresses that are obtained from the simulated physical network are
+// obtained (or lost) at once.
+class NetworkModel : public NetworkView {
+public:
+    NetworkModel(const SimState& sim, nlohmann::json& state) : NetworkView(sim, state), _state(state) {}
+
+    // Configures the interface anew from its configuration: static addresses
+    // as configured, a DHCP lease, the link-local address, router-advertised
+    // and DHCPv6 addresses obtained as far as the interface is up, has link
+    // and the network answers. A disabled interface keeps only its static
+    // addresses.
+    void Configure(const std::string& vnicPointer);
+    // Asks the DHCP servers again (DHCPv4 and, with IPv6, DHCPv6, as far as
+    // the interface uses them); throws when it uses neither.
+    void RenewLeases(const std::string& vnicPointer);
+    // Takes the configuration (only the static IPv6 entries of its address
+    // list) and configures the interface with it.
+    void SetIpConfig(const std::string& vnicPointer, const Network::IpConfig& config);
+    void SetMac(const std::string& vnicPointer, const std::string& mac);
+    void SetEnabled(const std::string& vnicPointer, bool enabled);
+    // Running DNS and routing from the saved ones, IPv6 as chosen for this
+    // boot, every virtual NIC configured anew.
+    void Boot();
+
+    void AddUplink(const std::string& vswitch, const std::string& pnic, bool standby);
+    void RemoveUplink(const std::string& vswitch, const std::string& pnic);
+    void SetPortGroupVlan(const std::string& vswitch, const std::string& portGroup, unsigned vlan);
+    void RemoveDvsUplink(const std::string& dvs, const std::string& pnic);
+
+private:
+    nlohmann::json& At(const std::string& pointer);
+    // The object at `pointer`; throws the state's error when it is missing or
+    // no object.
+    nlohmann::json& Object(const std::string& pointer);
+    std::string Mac(const std::string& vnicPointer) const;
+    // The pointer of a server of the VLAN ("dhcp", "routerAdvertisement",
+    // "dhcpv6"), or "" when the VLAN has none.
+    std::string Server(int vlan, const char* kind) const;
+    void LeaseIpv4(const std::string& vnicPointer);
+    // The IPv6 addresses the interface holds now, built from scratch.
+    nlohmann::json Ipv6Addresses(const std::string& vnicPointer);
+    // The DHCPv6 lease of the interface, added to `addresses` when there is one.
+    void LeaseIpv6(const std::string& vnicPointer, nlohmann::json& addresses);
+
+    nlohmann::json& _state;
+};
+
+}  // namespace HostCtl::Lib

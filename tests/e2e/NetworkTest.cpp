@@ -1,0 +1,235 @@
+// "Configure Management Network" with the real console on a simulated host:
+// the change set, the question on leaving, and the ordered apply with its
+// failures, checked on screen, in the host's log and in the host's state.
+#include <algorithm>
+
+#include "NetworkConsole.hpp"
+
+namespace E2e {
+namespace {
+
+using nlohmann::json;
+
+TEST_F(NetworkTest, StaticAddressThenTheWelcomeScreenShowsIt) {
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(SetStaticIpv4("192.0.2.10", "255.255.255.0", "192.0.2.254"));
+    ASSERT_TRUE(SelectEntry(*t, "IPv4 Configuration"));
+    EXPECT_TRUE(t->Shows("IPv4 Address: 192.0.2.10"));
+    EXPECT_TRUE(t->Shows("Default Gateway: 192.0.2.254"));
+    EXPECT_TRUE(t->Shows("Manual"));
+    // Nothing reached the host yet.
+    EXPECT_EQ(host.Get("/network/vnics/0/ipv4/address"), "192.0.2.100");
+
+    ASSERT_TRUE(LeaveAndApply());
+    EXPECT_EQ(
+        Logged({"Setting ipv4 configuration to 192.0.2.10/255.255.255.0 on qk0", "Setting ipv6 configuration",
+                "Setting default gateway to 192.0.2.254", "Setting hostname to host1",
+                "Setting nameservers to 192.0.2.53", "Setting suffixes to example.test",
+                "Network settings changed."}),
+        (std::vector<std::string>{"Setting ipv4 configuration to 192.0.2.10/255.255.255.0 on qk0",
+                                  "Setting ipv6 configuration", "Setting default gateway to 192.0.2.254",
+                                  "Setting hostname to host1", "Setting nameservers to 192.0.2.53",
+                                  "Setting suffixes to example.test", "Network settings changed."}))
+        << Joined(host.SyslogLines());
+    // Static and without DHCP there is nothing to renew.
+    EXPECT_TRUE(NotLogged(host, "Renew DHCP lease"));
+    // A name without a dot is a host name, not a fully qualified one.
+    std::vector<std::string> calls;
+    for (const json& e : History(host, {"hostctl"})) calls.push_back(e["operation"]);
+    EXPECT_NE(std::find(calls.begin(), calls.end(), "SetHostname"), calls.end()) << json(calls).dump();
+    EXPECT_EQ(std::find(calls.begin(), calls.end(), "SetFqdn"), calls.end()) << json(calls).dump();
+    const json ipv4 = host.Get("/network/vnics/0/ipv4");
+    EXPECT_EQ(ipv4["address"], "192.0.2.10");
+    EXPECT_EQ(ipv4["netmask"], "255.255.255.0");
+    EXPECT_EQ(ipv4["dhcp"], false);
+    EXPECT_EQ(host.Get("/network/routing/ipv4Gateway"), "192.0.2.254");
+    ASSERT_TRUE(WaitForHistory(host, "hrm-cmd"));
+    const std::vector<json> agent = History(host, {"hrm-cmd"});
+    EXPECT_TRUE(std::any_of(agent.begin(), agent.end(), [](const json& e) {
+        return e.value("command", "") == "internalsvc/refresh";
+    })) << json(agent).dump(1);
+
+    // The main menu reads the host at once, the welcome screen after log-out.
+    ASSERT_TRUE(WaitForMenu(*t));
+    ASSERT_TRUE(SelectEntry(*t, "Configure Management Network"));
+    EXPECT_TRUE(t->Shows("192.0.2.10"));
+    t->SendKey("Esc");
+    ASSERT_TRUE(WaitForWelcome(*t));
+    EXPECT_TRUE(t->WaitForText("http://192.0.2.10/ (STATIC)"));
+}
+
+TEST_F(NetworkTest, EveryStepAppliesInItsOrder) {
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(EditEverything());
+    ASSERT_TRUE(LeaveAndApply());
+
+    const std::vector<std::string> steps = {
+        "Setting adapters to zonic0 zonic1",
+        "Adding uplink zonic1",
+        "Setting VlanID to 20",
+        "Setting ipv4 configuration to 198.51.100.10/255.255.255.0 on qk0",
+        "Setting ipv6 configuration",
+        "Setting default gateway to 198.51.100.1",
+        "Setting default ipv6 gateway to 2001:db8:20::1",
+        "Changed vlan, restarting management interface",
+        "Setting hostname to esx7.lab.test",
+        "Setting nameservers to 198.51.100.53 2001:db8:20::53",
+        "Setting suffixes to lab.test, corp.test",
+        "Network settings changed."};
+    EXPECT_EQ(Logged(steps), steps) << Joined(host.SyslogLines());
+    EXPECT_TRUE(NotLogged(host, "failed"));
+
+    // What the host itself recorded, in order, with the agent's refresh last.
+    std::vector<std::string> calls;
+    for (const json& e : History(host, {"hostctl"})) calls.push_back(e["operation"]);
+    EXPECT_EQ(calls,
+              (std::vector<std::string>{"AddUplinkToTeamingPolicy", "SetPortGroupVlanId", "SetIpv6Enabled",
+                                        "SetVnicIpConfig", "SetDefaultGateway", "SetIpv6DefaultGateway",
+                                        "SetVnicEnabled", "SetVnicEnabled", "SetFqdn", "RemoveNameServers",
+                                        "AddNameServer", "AddNameServer", "SetSearchDomains", "SaveConfig"}));
+    const std::vector<json> record = History(host, {"hostctl", "hrm-cmd"});
+    ASSERT_FALSE(record.empty());
+    EXPECT_EQ(record.back().value("command", ""), "internalsvc/refresh") << json(record).dump(1);
+    EXPECT_EQ(History(host, {"hostctl"})[0]["args"], json({"kSwitch0", "zonic1", "active"}));
+
+    const json network = host.Get("/network");
+    const json& vswitch = network["vswitches"][0];
+    EXPECT_EQ(vswitch["teaming"]["active"].size() + vswitch["teaming"]["standby"].size(), 2u)
+        << vswitch.dump(1);
+    EXPECT_EQ(vswitch["portgroups"][0]["vlan"], 20);
+    const json& vnic = network["vnics"][0];
+    EXPECT_EQ(vnic["ipv4"]["address"], "198.51.100.10");
+    bool staticV6 = false;
+    for (const json& a : vnic["ipv6"]["addresses"])
+        staticV6 |= a["address"] == "2001:db8:20::10" && a["prefix"] == 64 && a["type"] == "static";
+    EXPECT_TRUE(staticV6) << vnic.dump(1);
+    EXPECT_EQ(network["routing"]["ipv4Gateway"], "198.51.100.1");
+    EXPECT_EQ(network["routing"]["ipv6Gateway"], "2001:db8:20::1");
+    EXPECT_EQ(network["dns"]["hostname"], "esx7");
+    EXPECT_EQ(network["dns"]["domain"], "lab.test");
+    EXPECT_EQ(network["dns"]["servers"], json{"198.51.100.53"});
+    EXPECT_EQ(network["dns"]["ipv6Servers"], json{"2001:db8:20::53"});
+    EXPECT_EQ(network["dns"]["searchDomains"], json({"lab.test", "corp.test"}));
+    // Saved, so that a boot keeps it.
+    EXPECT_EQ(network["saved"]["dns"], network["dns"]);
+    EXPECT_EQ(network["saved"]["routing"]["ipv4Gateway"], "198.51.100.1");
+    EXPECT_TRUE(host.ReadFile("/etc/hosts").find("198.51.100.10\tesx7.lab.test esx7") != std::string::npos)
+        << host.ReadFile("/etc/hosts");
+}
+
+class StaticNetworkTest : public NetworkTest {
+protected:
+    StaticNetworkTest() : NetworkTest("static") {}
+
+    // IPv4 from DHCP on the management port group's VLAN `vlan`.
+    ::testing::AssertionResult SwitchToDhcp(const std::string& vlan) {
+        if (auto open = OpenNetwork(); !open) return open;
+        if (auto open = OpenDialog("VLAN (optional)", "VLAN ID (1-4094"); !open) return open;
+        Keys({vlan});
+        if (auto ok = Confirm("VLAN ID (1-4094"); !ok) return ok;
+        if (auto open = OpenDialog("IPv4 Configuration", "Set static IPv4 address"); !open) return open;
+        Keys({"Down", " "});
+        if (auto ok = Confirm("Set static IPv4 address"); !ok) return ok;
+        if (auto applied = LeaveAndApply(); !applied) return applied;
+        if (auto menu = WaitForMenu(*t); !menu) return menu;
+        t->SendKey("Esc");
+        return WaitForWelcome(*t);
+    }
+};
+
+TEST_F(StaticNetworkTest, DhcpOnAVlanWithAServerShowsTheLease) {
+    ASSERT_TRUE(SwitchToDhcp("20"));
+    EXPECT_TRUE(WaitForLog(host, "Switching to DHCP on qk0"));
+    EXPECT_TRUE(WaitForLog(host, "Renew DHCP lease on qk0"));
+    EXPECT_TRUE(t->WaitForText("http://198.51.100.100/ (DHCP)"));
+    EXPECT_TRUE(t->Lacks("DHCP lookup failed"));
+    EXPECT_EQ(host.Get("/network/routing/ipv4Gateway"), "198.51.100.1");
+}
+
+TEST_F(StaticNetworkTest, DhcpWithoutAServerShowsTheWarning) {
+    ASSERT_TRUE(SwitchToDhcp("30"));
+    EXPECT_TRUE(t->WaitForText("Warning: DHCP lookup failed."));
+    EXPECT_EQ(host.Get("/network/vnics/0/ipv4/address"), "0.0.0.0");
+}
+
+// The state is replaced whole at every step: a console killed in the middle
+// of the apply leaves a state that every tool still reads.
+TEST_F(NetworkTest, KillDuringTheApplyLeavesAValidState) {
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(EditEverything());
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitForText(kRestartQuestion));
+    t->Send("y");
+    ASSERT_TRUE(WaitForLog(host, "Setting ipv4 configuration"));
+    t->Signal(SIGKILL);
+    t->WaitForExit();
+    const json network = host.Get("/network");
+    EXPECT_TRUE(network["vnics"][0]["ipv4"]["address"] == "192.0.2.100" ||
+                network["vnics"][0]["ipv4"]["address"] == "198.51.100.10")
+        << network["vnics"][0].dump(1);
+    EXPECT_EQ(network["vswitches"][0]["portgroups"][0]["vlan"], 20);
+}
+
+// One host operation made to fail: its line is logged and shown, and the
+// steps after it still reach the host.
+struct FaultCase {
+    const char* name;
+    const char* operation;  // "" when the step is made to fail by its input
+    const char* line;       // the failure line, up to the exception's text
+};
+void PrintTo(const FaultCase& c, std::ostream* os) { *os << c.name; }
+
+class NetworkFaultTest : public NetworkTest, public ::testing::WithParamInterface<FaultCase> {};
+
+TEST_P(NetworkFaultTest, FailedStepIsShownAndTheRestGoesOn) {
+    const FaultCase& c = GetParam();
+    const std::string message = std::string("injected failure of ") + c.operation;
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(EditEverything());
+    // After the edits: a read that fails when the window opens keeps its
+    // entry from being edited at all.
+    if (*c.operation) host.Fail(c.operation, message);
+    if (!*c.operation) {
+        // The network address of its own subnet passes the dialog but not the host.
+        ASSERT_TRUE(SetStaticIpv4("198.51.100.0", "255.255.255.0", "198.51.100.1"));
+    }
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitForText(kRestartQuestion));
+    t->Send("y");
+    ASSERT_TRUE(t->WaitForText(kErrorTitle));
+    EXPECT_TRUE(t->Shows(c.line)) << t->Dump();
+    // Later failures of the same fault (a step may call it more than once)
+    // are closed too.
+    for (int i = 0; i < 5 && t->Contains(kErrorTitle); ++i) {
+        t->SendKey("Enter");
+        ASSERT_TRUE(t->WaitQuiet(Duration(200)));
+    }
+    ASSERT_TRUE(WaitForLog(host, "Network settings changed."));
+    EXPECT_FALSE(host.ConsoleLog(std::string("user.err: ") + c.line, t->Pid()).empty())
+        << Joined(host.SyslogLines());
+
+    // The last steps reached the host all the same.
+    EXPECT_EQ(host.Get("/network/dns/searchDomains"), json({"lab.test", "corp.test"}));
+    ASSERT_TRUE(WaitForHistory(host, "hrm-cmd"));
+}
+
+const FaultCase kFaultCases[] = {
+    {"AddUplink", "AddUplinkToTeamingPolicy", "VS: add uplink to teaming policy failed: "},
+    {"MaxActiveUplinks", "GetMaxActiveUplinks", "Getting max number of active uplinks failed: "},
+    {"ReadVlan", "GetPortGroupVlanId", "Getting VlanID failed: "},
+    {"SetVlan", "SetPortGroupVlanId", "Setting VlanID failed: "},
+    {"StaticAddress", "", "Setting ip configuration failed: "},
+    {"Ipv6Enablement", "SetIpv6Enabled", "Setting ipv6 configuration failed: "},
+    {"IpConfiguration", "SetVnicIpConfig", "Setting ip/ipv6 configuration failed: "},
+    {"Gateway", "SetDefaultGateway", "Setting default gateway failed: "},
+    {"Ipv6Gateway", "SetIpv6DefaultGateway", "Setting default ipv6 gateway failed: "},
+    {"Restart", "SetVnicEnabled", "Restarting management interface failed: "},
+    {"Hostname", "SetFqdn", "Setting DNS failed: "},
+    {"NameServers", "RemoveNameServers", "Setting DNS failed: "},
+    {"Save", "SaveConfig", "Setting DNS failed: "},
+};
+INSTANTIATE_TEST_SUITE_P(Steps, NetworkFaultTest, ::testing::ValuesIn(kFaultCases),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+}  // namespace
+}  // namespace E2e
