@@ -399,12 +399,21 @@ std::string CreateHostRoot(const HostRootOptions& options) {
     WriteFile(root / "sbin/poweroff", ToolScript(options.hostCommandBinary, root, "poweroff"), 0755);
     WriteFile(root / "sbin/firmwareConfig.sh",
               ToolScript(options.hostCommandBinary, root, "firmwareConfig.sh"), 0755);
+    WriteFile(root / "sbin/qelping", ToolScript(options.hostCommandBinary, root, "qelping"), 0755);
     MakePam(root, options.password.empty() ? DemoPassword() : options.password);
 
     WriteFile(root / "bin/openssl", ToolScript(options.hostCommandBinary, root, "openssl"), 0755);
     MakeSymlink(SSH_KEYGEN, root / "usr/lib/zolva/openssh/bin/ssh-keygen");
     MakeSymlink("/usr/bin/less", root / "bin/less");
     MakeSymlink("/bin/sh", root / "bin/sh");
+
+    // Services: the init scripts, advanced-option tools, the management
+    // agents' start script and the live-core tool.
+    MakeDirectories(root / "etc/init.d");
+    for (const char* script : {"TarnShell", "SSH"})
+        WriteFile(root / "etc/init.d" / script, ToolScript(options.hostCommandBinary, root, script), 0755);
+    for (const char* tool : {"tarncfg-advcfg", "tarncli", "localcli", "services.sh", "qelbacktrace"})
+        WriteFile(root / "sbin" / tool, ToolScript(options.hostCommandBinary, root, tool), 0755);
     return root.string();
 }
 

@@ -54,6 +54,19 @@ Handler SetService(const std::string& service, const std::string& field, bool va
     };
 }
 
+// The agent opens or closes the firewall for SSH along with the service (a
+// host without the ruleset has no firewall to change).
+Handler SwitchSsh(bool running) {
+    return [running](const SimState& sim, json& state) {
+        Outcome outcome = SetService("ssh", "running", running)(sim, state);
+        const json::json_pointer ruleset("/firewall/rulesets/sshServer");
+        if (state.contains(ruleset))
+            ObjectMember(sim, state["firewall"]["rulesets"], "/firewall/rulesets", "sshServer")["enabled"] =
+                running;
+        return outcome;
+    };
+}
+
 const std::map<std::string, Handler>& Commands() {
     static const std::map<std::string, Handler> commands = {
         {"hrmsvc/auth/lockdown_is_enabled", PrintFlag("/hostAgent/lockdownEnabled")},
@@ -66,8 +79,8 @@ const std::map<std::string, Handler>& Commands() {
         {"hostsvc/stop_tarn_shell", SetService("tarnShell", "running", false)},
         {"hostsvc/enable_tarn_shell", SetService("tarnShell", "enabled", true)},
         {"hostsvc/disable_tarn_shell", SetService("tarnShell", "enabled", false)},
-        {"hostsvc/start_ssh", SetService("ssh", "running", true)},
-        {"hostsvc/stop_ssh", SetService("ssh", "running", false)},
+        {"hostsvc/start_ssh", SwitchSsh(true)},
+        {"hostsvc/stop_ssh", SwitchSsh(false)},
         {"hostsvc/enable_ssh", SetService("ssh", "enabled", true)},
         {"hostsvc/disable_ssh", SetService("ssh", "enabled", false)},
     };

@@ -144,6 +144,8 @@ void ApplyNetworkShapes(json& state, const std::vector<std::string>& shapes) {
         for (const char* kind : {"dhcp", "dhcpv6"})
             if (servers.contains(kind)) servers[kind]["leases"] = json::object();
     HostCtl::Lib::BootNetwork(HostCtl::Lib::SimState("."), state);
+    // The network's DNS knows the host by the address it got.
+    HostCtl::Lib::RegisterHostInDnsZone(state);
 }
 
 }  // namespace VelkTools

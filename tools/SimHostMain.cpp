@@ -2,6 +2,8 @@
 //   velk-simhost create ROOT [--hostname NAME] [--password P] [--network SHAPE[,SHAPE...]] [--force]
 //   velk-simhost boot ROOT
 //   velk-simhost fail ROOT OPERATION [MESSAGE | --clear]
+//   velk-simhost fail ROOT 'TOOL [WORD]' [STDERR | --clear]
+//   velk-simhost slow ROOT 'TOOL [WORD]' SECONDS
 //   velk-simhost login ROOT
 //   velk-simhost get ROOT POINTER
 //   velk-simhost set ROOT POINTER VALUE
@@ -21,6 +23,7 @@
 #include "HostRootCreator.hpp"
 #include "NetworkShapes.hpp"
 #include "StateEdit.hpp"
+#include "ToolFaults.hpp"
 #include "ToolSupport.hpp"
 #include "hostctl/SimNetwork.hpp"
 #include "hostctl/SimState.hpp"
@@ -35,6 +38,8 @@ const char* const USAGE =
     "[--force]\n"
     "       velk-simhost boot ROOT\n"
     "       velk-simhost fail ROOT OPERATION [MESSAGE | --clear]\n"
+    "       velk-simhost fail ROOT 'TOOL [WORD]' [STDERR | --clear]\n"
+    "       velk-simhost slow ROOT 'TOOL [WORD]' SECONDS\n"
     "       velk-simhost login ROOT\n"
     "       velk-simhost get ROOT POINTER\n"
     "       velk-simhost set ROOT POINTER VALUE\n"
@@ -54,7 +59,12 @@ const char* const USAGE =
     "  interface configured anew from the simulated network; power state \"on\".\n"
     "fail: makes the host control operation OPERATION (a backend method name such as\n"
     "  SetVnicIpConfig or GetPnics) fail with MESSAGE (default \"simulated failure of\n"
-    "  OPERATION\") until cleared with --clear.\n";
+    "  OPERATION\") until cleared with --clear. With a host tool instead (hrm-cmd, TarnShell,\n"
+    "  SSH, tarncfg-advcfg, tarncli, localcli, services.sh, qelbacktrace, powerOffVms, reboot,\n"
+    "  poweroff, firmwareConfig.sh, grabCIMData), every call of the tool, or with WORD every\n"
+    "  call that has WORD among its arguments ('hrm-cmd hostsvc/start_ssh', 'services.sh stop'),\n"
+    "  prints STDERR on its standard error and exits with status 1 without changing anything.\n"
+    "slow: makes those calls of a host tool wait SECONDS before they act (0 clears).\n";
 
 int Usage(const std::string& problem) {
     if (!problem.empty()) std::fprintf(stderr, "velk-simhost: %s\n", problem.c_str());
@@ -130,16 +140,19 @@ int Boot(const std::vector<std::string>& args) {
     return 0;
 }
 
-// Sets or clears a fault: the named host control operation fails with the
-// message until the fault is cleared.
+// Sets or clears a fault: the named host control operation, or the calls of
+// a host tool, fail with the message until the fault is cleared.
 int Fail(const std::vector<std::string>& args) {
     if (args.size() < 2 || args.size() > 3) return Usage("fail takes ROOT OPERATION [MESSAGE | --clear]");
     const std::string& operation = args[1];
     const std::vector<std::string>& known = HostCtl::Lib::SimulatedOperations();
-    if (std::find(known.begin(), known.end(), operation) == known.end()) {
-        std::string list;
+    const bool tool = VelkTools::IsToolFaultName(operation);
+    if (!tool && std::find(known.begin(), known.end(), operation) == known.end()) {
+        std::string list, tools;
         for (const std::string& name : known) list += (list.empty() ? "" : " ") + name;
-        return Error("unknown operation \"" + operation + "\"; the operations are: " + list);
+        for (const std::string& name : VelkTools::ToolNames()) tools += (tools.empty() ? "" : " ") + name;
+        return Error("unknown operation \"" + operation + "\"; the operations are: " + list +
+                     "; the tools are: " + tools);
     }
     const bool clear = args.size() == 3 && args[2] == "--clear";
     const std::string message = args.size() == 3 ? args[2] : "simulated failure of " + operation;
@@ -147,11 +160,36 @@ int Fail(const std::vector<std::string>& args) {
     HostCtl::Lib::SimState sim(args[0]);
     sim.Read();  // a missing or malformed state is reported before anything is made
     sim.Update([&](json& state) {
-        json& faults = VelkTools::ObjectMember(sim, state, "", "faults");
+        json& faults = VelkTools::ObjectMember(sim, state, "", tool ? "toolFaults" : "faults");
         if (clear)
             faults.erase(operation);
         else
             faults[operation] = message;
+    });
+    return 0;
+}
+
+// Makes the calls of a host tool wait before they act, or (0) no longer.
+int Slow(const std::vector<std::string>& args) {
+    if (args.size() != 3) return Usage("slow takes ROOT 'TOOL [WORD]' SECONDS");
+    const std::string& name = args[1];
+    if (!VelkTools::IsToolFaultName(name)) return Error("\"" + name + "\" does not name a host tool");
+    double seconds = -1;
+    try {
+        size_t used = 0;
+        seconds = std::stod(args[2], &used);
+        if (used != args[2].size()) seconds = -1;
+    } catch (const std::logic_error&) {
+    }
+    if (!(seconds >= 0 && seconds <= 3600)) return Usage("SECONDS must be a number from 0 to 3600");
+    HostCtl::Lib::SimState sim(args[0]);
+    sim.Read();
+    sim.Update([&](json& state) {
+        json& delays = VelkTools::ObjectMember(sim, state, "", "toolDelays");
+        if (seconds == 0)
+            delays.erase(name);
+        else
+            delays[name] = seconds;
     });
     return 0;
 }
@@ -248,6 +286,7 @@ int main(int argc, char** argv) {
         if (command == "create") return Create(args);
         if (command == "boot") return Boot(args);
         if (command == "fail") return Fail(args);
+        if (command == "slow") return Slow(args);
         if (command == "login") return Login(args);
         if (command == "get" || command == "set" || command == "remove") return Edit(command, args);
         if (command == "card") return Card(args);

@@ -4,6 +4,7 @@
 #include <pthread.h>
 #include <sys/ioctl.h>
 #include <sys/select.h>
+#include <sys/wait.h>
 #include <syslog.h>
 #include <unistd.h>
 
@@ -11,6 +12,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <memory>
+#include <vector>
 
 #include "Console.hpp"
 #include "StringFactory.hpp"
@@ -30,9 +32,29 @@ std::string Frame::_loginName;
 bool Frame::_loggedIn = false;
 bool Frame::_markForRestart = false;
 unsigned int Frame::_idleTimeout = 600;
+std::function<void(pid_t, int)> Frame::_childExitHandler;
 
 namespace {
 constexpr long kDimSeconds = 60;
+
+struct WatchedChild {
+    pid_t pid;
+    bool killAtExit;
+};
+std::vector<WatchedChild>& Watched() {
+    static std::vector<WatchedChild> children;
+    return children;
+}
+
+// At exit: children that must not outlive the console are killed; every
+// watched child that has ended is reaped.
+void EndWatchedChildren() {
+    for (const WatchedChild& child : Watched()) {
+        if (child.killAtExit) kill(child.pid, SIGKILL);
+        int status;
+        waitpid(child.pid, &status, child.killAtExit ? 0 : WNOHANG);
+    }
+}
 
 // Time left from now until deadline, never negative.
 struct timeval Remaining(const struct timeval& now, const struct timeval& deadline) {
@@ -124,6 +146,10 @@ int Frame::GetKey(bool useIdleTimeout) {
                 exit(0);
             case EV_TERMINATE:
                 exit(0);
+            case EV_CHILD:
+                ReapWatchedChildren();
+                if (_childExitHandler) return EV_CHILD;
+                continue;
             default:
                 break;
         }
@@ -165,7 +191,7 @@ int Frame::WaitForInput(struct timeval* timeout) {
         do {
             r = read(_signalPipe[0], &byte, 1);
         } while (r <= 0 && errno == EINTR);
-        if (r == 1 && byte >= 1 && byte <= 4) return -2 - byte;
+        if (r == 1 && byte >= 1 && byte <= 5) return -2 - byte;
     }
     return EV_ERROR;
 }
@@ -176,7 +202,10 @@ void Frame::StartSignalHandling() {
         exit(1);
     }
     sigemptyset(&_signalSet);
-    for (int sig : {SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGWINCH}) sigaddset(&_signalSet, sig);
+    // SIGCHLD too: a child's end reaches the key loop as a pipe byte, never as
+    // an interruption somewhere else.
+    for (int sig : {SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGWINCH, SIGCHLD})
+        sigaddset(&_signalSet, sig);
     if (pthread_sigmask(SIG_BLOCK, &_signalSet, nullptr) != 0) LogError("pthread_sigmask() failed");
     pthread_t thread;
     if (pthread_create(&thread, nullptr, SignalHandler, nullptr) != 0) {
@@ -204,6 +233,9 @@ void* Frame::SignalHandler(void*) {
             case SIGWINCH:
                 byte = 3;
                 break;
+            case SIGCHLD:
+                byte = 5;
+                break;
             case SIGINT:
             case SIGQUIT:
             case SIGTERM:
@@ -218,6 +250,32 @@ void* Frame::SignalHandler(void*) {
         } while (w <= 0 && errno == EINTR);
     }
     return nullptr;
+}
+
+void Frame::WatchChild(pid_t pid, bool killAtExit) {
+    static const bool registered = [] { return std::atexit(EndWatchedChildren) == 0; }();
+    (void)registered;
+    Watched().push_back({pid, killAtExit});
+}
+
+void Frame::ReapWatchedChildren() {
+    std::vector<WatchedChild>& children = Watched();
+    for (size_t i = 0; i < children.size();) {
+        int status = 0;
+        pid_t r;
+        do {
+            r = waitpid(children[i].pid, &status, WNOHANG);
+        } while (r < 0 && errno == EINTR);
+        if (r == 0) {
+            ++i;
+            continue;
+        }
+        const pid_t pid = children[i].pid;
+        children.erase(children.begin() + static_cast<std::ptrdiff_t>(i));
+        // A child that cannot be waited for is over as far as the console can
+        // tell; it counts as failed.
+        if (_childExitHandler) _childExitHandler(pid, r == pid ? status : 1 << 8);
+    }
 }
 
 void Frame::ResizeTerminal() {

@@ -6,6 +6,7 @@
 #include <signal.h>
 #include <sys/time.h>
 
+#include <functional>
 #include <string>
 
 #include "Window.hpp"
@@ -41,6 +42,16 @@ public:
     static bool IsSmartCardPresent(const std::string& userId);
     static void CheckSmartCard();
 
+    // Children the console does not wait for at once: each is reaped as soon
+    // as it ends (no zombie stays behind) and reported to _childExitHandler.
+    // Those marked killAtExit are killed and reaped when the console ends.
+    static void WatchChild(pid_t pid, bool killAtExit);
+    static void ReapWatchedChildren();
+    // Told of each watched child that ended (pid, raw wait status); while one
+    // is set, GetKey also returns EV_CHILD after a child ended, so that a
+    // screen waiting for a child can look again.
+    static std::function<void(pid_t, int)> _childExitHandler;
+
     // Event codes of WaitForInput.
     enum Event {
         EV_ERROR = -1,
@@ -48,7 +59,8 @@ public:
         EV_REFRESH = -3,
         EV_RESTART = -4,
         EV_RESIZE = -5,
-        EV_TERMINATE = -6
+        EV_TERMINATE = -6,
+        EV_CHILD = -7
     };
 
     static Frame* fgFrame;

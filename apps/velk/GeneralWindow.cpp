@@ -11,11 +11,16 @@
 #include "Console.hpp"
 #include "DriverVMDialog.hpp"
 #include "KeyboardDialog.hpp"
+#include "LockdownDialog.hpp"
 #include "ManagementInterface.hpp"
 #include "MessageDialog.hpp"
+#include "NetworkRestoreWindow.hpp"
 #include "NetworkWindow.hpp"
+#include "RestartNetworkDialog.hpp"
 #include "RestoreDialog.hpp"
 #include "StringFactory.hpp"
+#include "TestDialog.hpp"
+#include "TroubleShootingWindow.hpp"
 #include "hostctl/Host.hpp"
 #include "hostctl/QelCtl.hpp"
 
@@ -289,12 +294,24 @@ void GeneralWindow::OpenEntry(int textId) {
             screen = std::make_unique<NetworkWindow>(this);
             break;
         case 6:
-        case 9:
-        case 10:
-        case 11:
+            screen = std::make_unique<LockdownDialog>(this);
+            break;
         case 14:
-            screen =
-                std::make_unique<MessageDialog>(this, textId, "This function is not available on this host.");
+            screen = std::make_unique<TroubleShootingWindow>(this);
+            break;
+        case 9:
+            if (auto mgmt = GetManagementInterface()) {
+                screen = std::make_unique<RestartNetworkDialog>(this, std::move(mgmt));
+            } else {
+                HostCtl::Lib::Syslog(LOG_ERR, "Could not get a suitable management interface");
+                screen = std::make_unique<MessageDialog>(this, 17, 20);
+            }
+            break;
+        case 10:
+            screen = std::make_unique<TestDialog>(this);
+            break;
+        case 11:
+            screen = std::make_unique<NetworkRestoreWindow>(this);
             break;
         default:
             return;

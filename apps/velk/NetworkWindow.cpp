@@ -224,28 +224,16 @@ std::string NetworkWindow::DnsDescription() const {
 int NetworkWindow::Run() {
     if (!ReadConfiguration()) return false;
     Draw();
-    for (;;) {
-        switch (GetKey(true)) {
-            case KEY_DOWN:
-                _menu->Down();
-                DrawDescription();
-                break;
-            case KEY_UP:
-                _menu->Up();
-                DrawDescription();
-                break;
-            case '\n':
-                OpenEntry(_menu->GetCurrentIndex());
-                Draw();
-                break;
-            case 27:
-                if (Leave()) return true;
-                Draw();
-                break;
-            default:
-                break;
-        }
-    }
+    return RunMenu([this] { DrawDescription(); },
+                   [this](int entry) {
+                       OpenEntry(entry);
+                       Draw();
+                   },
+                   [this] {
+                       if (Leave()) return true;
+                       Draw();
+                       return false;
+                   });
 }
 
 void NetworkWindow::OpenEntry(int entry) {

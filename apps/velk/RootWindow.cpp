@@ -48,4 +48,28 @@ void RootWindow::Draw() {
     Refresh();
 }
 
+int RootWindow::RunMenu(const std::function<void()>& describe, const std::function<void(int)>& open,
+                        const std::function<bool()>& leave) {
+    for (;;) {
+        switch (GetKey(true)) {
+            case KEY_DOWN:
+                _menu->Down();
+                describe();
+                break;
+            case KEY_UP:
+                _menu->Up();
+                describe();
+                break;
+            case '\n':
+                open(_menu->GetCurrentIndex());
+                break;
+            case 27:
+                if (leave()) return true;
+                break;
+            default:
+                break;
+        }
+    }
+}
+
 }  // namespace Velk

@@ -3,6 +3,7 @@
 // status line at the bottom.
 #pragma once
 
+#include <functional>
 #include <string>
 
 #include "Frame.hpp"
@@ -24,6 +25,12 @@ public:
 
     // Shows the window, the heading and the subclass's contents.
     void Draw();
+
+    // The key loop of a sub-menu: Up and Down move the selection and call
+    // `describe`, Enter calls `open` with the selected entry's index, Esc
+    // ends the loop with true once `leave` agrees. Other keys are ignored.
+    int RunMenu(const std::function<void()>& describe, const std::function<void(int)>& open,
+                const std::function<bool()>& leave);
 
 protected:
     virtual void DrawContents() = 0;

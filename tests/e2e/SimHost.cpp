@@ -121,6 +121,10 @@ void SimHost::Fail(const std::string& operation, const std::string& message) {
 
 void SimHost::Clear(const std::string& operation) { Tool({"fail", _root, operation, "--clear"}); }
 
+void SimHost::Slow(const std::string& tool, double seconds) {
+    Tool({"slow", _root, tool, std::to_string(seconds)});
+}
+
 void SimHost::Boot() { Tool({"boot", _root}); }
 
 void SimHost::PullCard(int slot) { Tool({"card", _root, "pull", "--slot", std::to_string(slot)}); }

@@ -15,6 +15,7 @@
 #include <memory>
 #include <mutex>
 #include <string>
+#include <system_error>
 
 #include "UnsupportedHostBackend.hpp"
 #include "hostctl/Backend.hpp"
@@ -238,6 +239,49 @@ void Syslog(int priority, const char* format, ...) {
     va_start(args, format);
     VSyslog(priority, format, args);
     va_end(args);
+}
+
+void ReplaceFile(const std::string& path, const std::string& text, mode_t mode) {
+    auto fail = [&](const std::string& what, int err) {
+        return HostCtlException(path + ": " + what + ": " +
+                                std::error_code(err, std::generic_category()).message());
+    };
+    std::string tmp = path + ".XXXXXX";
+    const int fd = mkostemp(tmp.data(), O_CLOEXEC);
+    if (fd < 0) throw fail("cannot create a temporary file", errno);
+    // Nothing but the complete file may take the old one's place.
+    auto abandon = [&](const char* what) {
+        const int err = errno;
+        close(fd);
+        unlink(tmp.c_str());
+        return fail(what, err);
+    };
+    for (size_t done = 0; done < text.size();) {
+        const ssize_t n = write(fd, text.data() + done, text.size() - done);
+        if (n < 0 && errno == EINTR) continue;
+        if (n < 0) throw abandon("cannot write");
+        done += size_t(n);
+    }
+    if (fchmod(fd, mode) < 0) throw abandon("cannot set the mode");
+    if (fsync(fd) < 0) throw abandon("cannot write");
+    if (close(fd) < 0) {
+        const int err = errno;
+        unlink(tmp.c_str());
+        throw fail("cannot write", err);
+    }
+    if (rename(tmp.c_str(), path.c_str()) < 0) {
+        const int err = errno;
+        unlink(tmp.c_str());
+        throw fail("cannot replace", err);
+    }
+    // Make the rename itself durable.
+    const size_t slash = path.rfind('/');
+    const std::string dir = slash == std::string::npos ? "." : slash == 0 ? "/" : path.substr(0, slash);
+    const int dirFd = open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (dirFd >= 0) {
+        fsync(dirFd);
+        close(dirFd);
+    }
 }
 
 std::string UtcTimestamp() {

@@ -62,6 +62,10 @@ void QelNic::SetIpConfig(const IpConfig& cfg) { Lib::GetBackend().SetVnicIpConfi
 
 ConnectionPoint QelNic::GetConnectionPoint() const { return Lib::GetBackend().GetVnicConnectionPoint(_name); }
 
+void QelNic::SetConnectionPoint(const ConnectionPoint& point) {
+    Lib::GetBackend().SetVnicConnectionPoint(_name, point);
+}
+
 std::string QelNic::GetMacAddress() const { return Lib::GetBackend().GetVnicMacAddress(_name); }
 
 void QelNic::SetMacAddress(const std::string& mac) { Lib::GetBackend().SetVnicMacAddress(_name, mac); }
@@ -97,6 +101,11 @@ std::vector<std::string> VirtualSwitch::GetPortGroupNames() const {
     return Lib::GetBackend().GetPortGroupNames(_name);
 }
 
+void VirtualSwitch::AddPortGroup(const std::string& portGroup, uint16_t vlanId) {
+    if (vlanId > 4095) throw Lib::HostCtlException("VLAN ID " + std::to_string(vlanId) + " is above 4095");
+    Lib::GetBackend().AddPortGroup(_name, portGroup, vlanId);
+}
+
 uint16_t VirtualSwitch::GetPortGroupVlanId(const std::string& portGroup) const {
     return Lib::GetBackend().GetPortGroupVlanId(_name, portGroup);
 }
@@ -121,6 +130,14 @@ void DistributedSwitch::RemoveUplink(const std::string& pnic) {
     Lib::GetBackend().RemoveDvsUplink(_name, pnic);
 }
 
+uint16_t DistributedSwitch::GetPortVlanId(const std::string& portKey) const {
+    return Lib::GetBackend().GetDvsPortVlanId(_name, portKey);
+}
+
+std::string DistributedSwitch::AddHostLocalPort(const std::string& fromPortKey) {
+    return Lib::GetBackend().AddDvsHostLocalPort(_name, fromPortKey);
+}
+
 }  // namespace Network
 
 namespace Adv {
@@ -142,5 +159,15 @@ void AdvancedStringOption::SetCurrent(const std::string& value) {
 }
 
 }  // namespace Adv
+
+// Services and firewall.
+namespace Firewall {
+
+void Ruleset::SetEnabled(bool enabled) {
+    Lib::GetBackend().SetFirewallRulesetEnabled(_id, enabled);
+    _enabled = enabled;
+}
+
+}  // namespace Firewall
 
 }  // namespace HostCtl

@@ -108,6 +108,14 @@ bool NetworkInfoImpl::IsQelIpv6Enabled() { return GetBackend().GetIpv6Enabled();
 
 void NetworkInfoImpl::SetQelIpv6Enabled(bool enabled) { GetBackend().SetIpv6Enabled(enabled); }
 
+std::vector<std::string> NetworkInfoImpl::GetVirtualNicNames() { return GetBackend().GetVnicNames(); }
+
+void NetworkInfoImpl::DisableNetDumper() { GetBackend().DisableNetDumper(); }
+
+void NetworkInfoImpl::ClearNetworkConfig() { GetBackend().ClearNetworkConfig(); }
+
+void NetworkInfoImpl::AutoConfigNetwork() { GetBackend().AutoConfigNetwork(); }
+
 namespace {
 
 bool IsValidLabel(const std::string& label) {
@@ -229,6 +237,15 @@ std::vector<std::string> VirtualSwitchInfoImpl::GetVirtualSwitchNames() {
     return GetBackend().GetVirtualSwitchNames();
 }
 
+void VirtualSwitchInfoImpl::AddVirtualSwitch(const std::string& name) {
+    if (!IsValidLabel(name)) throw HostCtlException("\"" + name + "\" is not a valid switch name");
+    GetBackend().AddVirtualSwitch(name);
+}
+
+std::vector<HostCtl::Network::IpAddress> NameResolverImpl::Resolve(const std::string& name) {
+    return GetBackend().ResolveHostName(name);
+}
+
 std::vector<std::string> DistributedSwitchInfoImpl::GetDistributedSwitchNames() {
     return GetBackend().GetDistributedSwitchNames();
 }
@@ -262,5 +279,26 @@ namespace Resource {
 bool ResourceInfoImpl::HasRunningVirtualMachines() { return GetBackend().HasRunningVirtualMachines(); }
 
 }  // namespace Resource
+
+// Services and firewall.
+
+namespace System {
+
+HostCtl::Firewall::Ruleset SystemInfoImpl::GetFirewallRulesetById(const std::string& id) {
+    return HostCtl::Firewall::Ruleset(id, GetBackend().GetFirewallRulesetEnabled(id));
+}
+
+}  // namespace System
+
+namespace Util {
+
+int QelCtl_Exec(const std::string& commandLine, bool logOutput, bool wait, bool throwOnFailure) {
+    const int result = GetBackend().RunCommandLine(commandLine, logOutput, wait);
+    if (result != 0 && throwOnFailure)
+        throw HostCtlException("\"" + commandLine + "\" failed with status " + std::to_string(result));
+    return result;
+}
+
+}  // namespace Util
 
 }  // namespace QelCtl

@@ -1,15 +1,24 @@
 // The backend of a simulated host: every operation reads or changes the
 // host's state file through SimState, so that all processes working on the
 // host see one state.
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <syslog.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <climits>
+#include <csignal>
 #include <cstdint>
+#include <cstring>
 #include <functional>
 #include <stdexcept>
 #include <utility>
 
 #include "SimNetworkModel.hpp"
 #include "hostctl/Backend.hpp"
+#include "hostctl/Host.hpp"
 #include "hostctl/QelCtl.hpp"
 #include "hostctl/SimNetwork.hpp"
 #include "hostctl/SimState.hpp"
@@ -43,6 +52,8 @@ const std::vector<std::string> OPERATIONS = {
     "GetVnicIpConfig",
     "SetVnicIpConfig",
     "GetVnicConnectionPoint",
+    "SetVnicConnectionPoint",
+    "GetVnicNames",
     "GetVnicMacAddress",
     "SetVnicMacAddress",
     "RenewVnicDhcpLease",
@@ -51,17 +62,25 @@ const std::vector<std::string> OPERATIONS = {
     "SetIpv6Enabled",
     "GetConnectionPointSwitch",
     "GetVirtualSwitchNames",
+    "AddVirtualSwitch",
     "GetVirtualSwitchUplinks",
     "GetTeamingPolicy",
     "GetMaxActiveUplinks",
     "AddUplinkToTeamingPolicy",
     "RemoveUplinkFromTeamingPolicy",
     "GetPortGroupNames",
+    "AddPortGroup",
     "GetPortGroupVlanId",
     "SetPortGroupVlanId",
     "GetDistributedSwitchNames",
     "GetDvsUplinkPorts",
     "RemoveDvsUplink",
+    "GetDvsPortVlanId",
+    "AddDvsHostLocalPort",
+    "DisableNetDumper",
+    "ClearNetworkConfig",
+    "AutoConfigNetwork",
+    "ResolveHostName",
     "GetDns",
     "SetHostname",
     "SetFqdn",
@@ -89,6 +108,10 @@ const std::vector<std::string> OPERATIONS = {
     "GetDriverVmState",
     "GetDriverVmDevices",
     "SetDriverVmOwned",
+    // Services and firewall.
+    "GetFirewallRulesetEnabled",
+    "SetFirewallRulesetEnabled",
+    "RunCommandLine",
 };
 
 bool IsSimulatedOperation(const char* name) {
@@ -255,6 +278,19 @@ public:
         });
     }
 
+    void SetVnicConnectionPoint(const std::string& vnic, const Network::ConnectionPoint& point) override {
+        Writing("SetVnicConnectionPoint",
+                [&](json& s) {
+                    NetworkModel network(_sim, s);
+                    network.SetConnectionPoint(network.VnicPointer(vnic), point.GetType(), point.GetName());
+                },
+                {vnic, point.GetType(), point.GetName()});
+    }
+
+    std::vector<std::string> GetVnicNames() override {
+        return Reading("GetVnicNames", [&](const json& s) { return Names(s, "/network/vnics"); });
+    }
+
     std::string GetVnicMacAddress(const std::string& vnic) override {
         return Reading("GetVnicMacAddress", [&](const json& s) {
             return _sim.String(s, NetworkView(_sim, s).VnicPointer(vnic) + "/mac");
@@ -315,6 +351,11 @@ public:
                        [&](const json& s) { return Names(s, "/network/vswitches"); });
     }
 
+    void AddVirtualSwitch(const std::string& vswitch) override {
+        Writing("AddVirtualSwitch", [&](json& s) { NetworkModel(_sim, s).AddVirtualSwitch(vswitch); },
+                {vswitch});
+    }
+
     std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) override {
         return Reading("GetVirtualSwitchUplinks", [&](const json& s) {
             return _sim.StringList(s, NetworkView(_sim, s).VswitchPointer(vswitch) + "/uplinks");
@@ -358,6 +399,12 @@ public:
         });
     }
 
+    void AddPortGroup(const std::string& vswitch, const std::string& portGroup, uint16_t vlanId) override {
+        Writing("AddPortGroup",
+                [&](json& s) { NetworkModel(_sim, s).AddPortGroup(vswitch, portGroup, vlanId); },
+                {vswitch, portGroup, vlanId});
+    }
+
     uint16_t GetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup) override {
         return Reading("GetPortGroupVlanId", [&](const json& s) {
             NetworkView network(_sim, s);
@@ -395,6 +442,47 @@ public:
     void RemoveDvsUplink(const std::string& dvs, const std::string& pnic) override {
         Writing("RemoveDvsUplink", [&](json& s) { NetworkModel(_sim, s).RemoveDvsUplink(dvs, pnic); },
                 {dvs, pnic});
+    }
+
+    uint16_t GetDvsPortVlanId(const std::string& dvs, const std::string& port) override {
+        return Reading("GetDvsPortVlanId", [&](const json& s) {
+            NetworkView network(_sim, s);
+            const std::string p = network.DvsPortPointer(network.DvsPointer(dvs), port) + "/vlan";
+            const uint64_t vlan = _sim.Unsigned(s, p);
+            if (vlan > 4095) throw _sim.Error("field " + p + " is above 4095");
+            return uint16_t(vlan);
+        });
+    }
+
+    std::string AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort) override {
+        std::string key;
+        Writing("AddDvsHostLocalPort",
+                [&](json& s) { key = NetworkModel(_sim, s).AddDvsHostLocalPort(dvs, fromPort); },
+                {dvs, fromPort});
+        return key;
+    }
+
+    // The factory restore of the network: the core dump sender lets go of
+    // its interface, the configuration is cleared, the factory network built.
+
+    void DisableNetDumper() override {
+        Writing("DisableNetDumper", [&](json& s) {
+            _sim.Bool(s, "/network/netDumper/enabled");
+            ObjectAt(s, "/network/netDumper")["enabled"] = false;
+        });
+    }
+
+    void ClearNetworkConfig() override {
+        Writing("ClearNetworkConfig", [&](json& s) { NetworkModel(_sim, s).ClearConfig(); });
+    }
+
+    void AutoConfigNetwork() override {
+        Writing("AutoConfigNetwork", [&](json& s) { NetworkModel(_sim, s).AutoConfig(); });
+    }
+
+    // The simulated network answers; the machine's own resolver is never asked.
+    std::vector<Network::IpAddress> ResolveHostName(const std::string& name) override {
+        return Reading("ResolveHostName", [&](const json& s) { return NetworkView(_sim, s).Resolve(name); });
     }
 
     // Name service and routing. The running configuration is "network/dns"
@@ -676,7 +764,136 @@ public:
         });
     }
 
+    // Services and firewall. A firewall ruleset is
+    // "/firewall/rulesets/<id>": {"enabled": bool}. Command lines run with
+    // the host's own shell and tools (see HostCommandLine).
+
+    bool GetFirewallRulesetEnabled(const std::string& id) override {
+        return Reading("GetFirewallRulesetEnabled",
+                       [&](const json& s) { return _sim.Bool(s, RulesetEnabledPointer(s, id)); });
+    }
+
+    void SetFirewallRulesetEnabled(const std::string& id, bool enabled) override {
+        Writing("SetFirewallRulesetEnabled",
+                [&](json& s) {
+                    const std::string pointer = RulesetEnabledPointer(s, id);
+                    _sim.Bool(s, pointer);  // a ruleset of another shape is refused
+                    s.at(json::json_pointer(pointer)) = enabled;
+                },
+                {id, enabled});
+    }
+
+    // The request is recorded first; the command then runs outside the
+    // state's lock, since the host's tools change the state themselves.
+    int RunCommandLine(const std::string& commandLine, bool logOutput, bool wait) override {
+        Writing("RunCommandLine", [](json&) {}, {commandLine, logOutput, wait});
+        return RunOnHost(_sim.Root(), commandLine, logOutput, wait);
+    }
+
 private:
+    std::string RulesetEnabledPointer(const json& s, const std::string& id) const {
+        if (!_sim.Object(s, "/firewall/rulesets").contains(id))
+            throw _sim.Error("no firewall ruleset \"" + id + "\"");
+        return "/firewall/rulesets/" + PointerStep(id) + "/enabled";
+    }
+
+    // The command line as the host's shell on `root` must see it: every word
+    // outside quotes that starts with "/" is a host path and gets the root
+    // in front ("/bin/sh /sbin/services.sh stop" runs the host's script),
+    // except the null device.
+    static std::string HostCommandLine(const std::string& root, const std::string& line) {
+        std::string quotedRoot = "'";
+        for (char c : root) quotedRoot += c == '\'' ? std::string("'\\''") : std::string(1, c);
+        quotedRoot += "'";
+        std::string out;
+        char quote = 0;
+        bool wordStart = true;
+        for (size_t i = 0; i < line.size(); ++i) {
+            const char c = line[i];
+            if (quote == 0 && wordStart && c == '/' && line.compare(i, 5, "/dev/") != 0) out += quotedRoot;
+            out += c;
+            if (quote != 0) {
+                if (c == quote) quote = 0;
+                wordStart = false;
+            } else if (c == '\'' || c == '"') {
+                quote = c;
+                wordStart = false;
+            } else {
+                wordStart = std::strchr(" \t\n;|&()<>", c) != nullptr;
+            }
+        }
+        return out;
+    }
+
+    static int RunOnHost(const std::string& root, const std::string& commandLine, bool logOutput, bool wait) {
+        std::string line = HostCommandLine(root, commandLine);
+        // A command that is not waited for runs in a background job of a
+        // shell that ends at once, so nothing is left to reap.
+        if (!wait) line = "(" + line + ") &";
+        const bool capture = logOutput && wait;
+        int fds[2] = {-1, -1};
+        if (capture && pipe2(fds, O_CLOEXEC) != 0)
+            throw HostCtlException(std::string("cannot create a pipe: ") + std::strerror(errno));
+
+        posix_spawn_file_actions_t actions;
+        posix_spawn_file_actions_init(&actions);
+        posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+        if (capture)
+            posix_spawn_file_actions_adddup2(&actions, fds[1], 1);
+        else
+            posix_spawn_file_actions_addopen(&actions, 1, "/dev/null", O_WRONLY, 0);
+        posix_spawn_file_actions_adddup2(&actions, 1, 2);
+        posix_spawn_file_actions_addclosefrom_np(&actions, 3);
+        // The caller may block signals (the console does, in every thread);
+        // the command starts with none blocked and default dispositions.
+        posix_spawnattr_t attr;
+        posix_spawnattr_init(&attr);
+        sigset_t none, defaults;
+        sigemptyset(&none);
+        sigemptyset(&defaults);
+        for (int sig : {SIGPIPE, SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGCHLD})
+            sigaddset(&defaults, sig);
+        posix_spawnattr_setsigmask(&attr, &none);
+        posix_spawnattr_setsigdefault(&attr, &defaults);
+        posix_spawnattr_setflags(&attr, POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
+
+        const std::string shell = root + "/bin/sh";
+        const std::string path = "PATH=" + root + "/sbin:" + root + "/bin";
+        const char* const argv[] = {"sh", "-c", line.c_str(), nullptr};
+        const char* const env[] = {"PYTHONHOME=/", path.c_str(), nullptr};
+        pid_t pid = -1;
+        const int rc = posix_spawn(&pid, shell.c_str(), &actions, &attr, const_cast<char* const*>(argv),
+                                   const_cast<char* const*>(env));
+        posix_spawn_file_actions_destroy(&actions);
+        posix_spawnattr_destroy(&attr);
+        if (capture) close(fds[1]);
+        if (rc != 0) {
+            if (capture) close(fds[0]);
+            throw HostCtlException("cannot run the host's shell " + shell + ": " + std::strerror(rc));
+        }
+        if (capture) {
+            std::string pending;
+            char buf[4096];
+            for (;;) {
+                const ssize_t n = read(fds[0], buf, sizeof buf);
+                if (n < 0 && errno == EINTR) continue;
+                if (n <= 0) break;
+                pending.append(buf, size_t(n));
+                for (size_t end; (end = pending.find('\n')) != std::string::npos; pending.erase(0, end + 1))
+                    Syslog(LOG_INFO, "%s", pending.substr(0, end).c_str());
+            }
+            if (!pending.empty()) Syslog(LOG_INFO, "%s", pending.c_str());
+            close(fds[0]);
+        }
+        int status = 0;
+        while (waitpid(pid, &status, 0) < 0) {
+            if (errno != EINTR)
+                throw HostCtlException(std::string("waiting for the shell: ") + std::strerror(errno));
+        }
+        if (WIFEXITED(status)) return WEXITSTATUS(status);
+        return WIFSIGNALED(status) ? 128 + WTERMSIG(status) : -1;
+    }
+
     // Runs `read` on the latest state, unless a fault is set for `operation`.
     // Library errors that a state of an unexpected shape could still raise
     // are turned into the state's errors.

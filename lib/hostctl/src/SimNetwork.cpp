@@ -1,11 +1,11 @@
 // The simulated host's network: links, VLANs, DHCP, router advertisements,
-// DHCPv6, switches, booting and the hosts file.
+// DHCPv6, switches, reachability and name resolution, booting and the hosts
+// file.
 #include "hostctl/SimNetwork.hpp"
 
-#include <fcntl.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
@@ -16,10 +16,12 @@
 #include <system_error>
 
 #include "SimNetworkModel.hpp"
+#include "hostctl/Host.hpp"
 #include "hostctl/QelCtl.hpp"
 
 namespace HostCtl::Lib {
 
+using Network::IpAddress;
 using Network::Ipv4Address;
 using Network::Ipv6Address;
 using nlohmann::json;
@@ -114,6 +116,44 @@ bool IsLoopback(const std::string& address) { return address.rfind("127.", 0) ==
 
 std::string ErrnoText(int err) { return std::error_code(err, std::generic_category()).message(); }
 
+// Host names compare without regard to letter case, as resolvers do.
+bool SameName(const std::string& a, const std::string& b) { return Lower(a) == Lower(b); }
+
+bool IsIpText(const std::string& text) {
+    return Ipv4Address::IsValidAddress(text) || Ipv6Address::IsValidAddress(text);
+}
+
+void AddOnce(std::vector<IpAddress>& list, const IpAddress& address) {
+    if (std::find(list.begin(), list.end(), address) == list.end()) list.push_back(address);
+}
+
+// The management interface's IPv4 address, or "" when it has none (or the
+// state does not tell).
+std::string ManagementIpv4(const json& state) {
+    const std::string vnic = TextAt(state, "/network/managementInterface");
+    if (vnic.empty() || !state.contains(json::json_pointer("/network/vnics"))) return "";
+    const json& vnics = state.at(json::json_pointer("/network/vnics"));
+    if (!vnics.is_array()) return "";
+    for (const json& v : vnics) {
+        if (!v.is_object() || v.value("name", json()) != vnic) continue;
+        const std::string address = TextAt(v, "/ipv4/address");
+        if (!Ipv4Address::IsValidAddress(address) || Ipv4Address(address).IsZero()) return "";
+        return address;
+    }
+    return "";
+}
+
+// Whether the interface has an IPv6 address of the right kind: any for a
+// link-local target, a global one otherwise.
+bool HasIpv6For(const json& addresses, const Ipv6Address& target) {
+    for (const json& a : addresses) {
+        const std::string text = a.is_object() ? TextAt(a, "/address") : "";
+        if (!Ipv6Address::IsValidAddress(text)) continue;
+        if (target.IsLinkLocal() || !Ipv6Address(text).IsLinkLocal()) return true;
+    }
+    return false;
+}
+
 }  // namespace
 
 // ---- NetworkView ----
@@ -155,6 +195,14 @@ std::string NetworkView::PortGroupPointer(const std::string& vswitchPointer,
 std::string NetworkView::DvsPointer(const std::string& dvs) const {
     std::string p = Find("/network/dvswitches", dvs);
     if (p.empty()) throw _sim.Error("no distributed switch named \"" + dvs + "\"");
+    return p;
+}
+
+std::string NetworkView::DvsPortPointer(const std::string& dvsPointer, const std::string& port) const {
+    std::string p = Find(dvsPointer + "/ports", port, "key");
+    if (p.empty())
+        throw _sim.Error("distributed switch \"" + _sim.String(_view, dvsPointer + "/name") +
+                         "\" has no port \"" + port + "\"");
     return p;
 }
 
@@ -257,6 +305,144 @@ int NetworkView::Vlan(const std::string& v) const {
     const uint64_t vlan = _sim.Unsigned(_view, at + "/vlan");
     if (vlan > 4095) throw _sim.Error("field " + at + "/vlan is above 4095");
     return int(vlan);
+}
+
+// ---- Reachability and name resolution ----
+
+const json* NetworkView::Machine(const std::string& pointer, const IpAddress& target) const {
+    const json::json_pointer at(pointer);
+    if (!_view.contains(at) || _view.at(at).is_null()) return nullptr;
+    // Every entry is checked, so that a broken list fails whatever is asked.
+    const json& machines = _sim.Object(_view, pointer);
+    const json* found = nullptr;
+    for (auto it = machines.begin(); it != machines.end(); ++it) {
+        if (!IsIpText(it.key()))
+            throw _sim.Error("field " + pointer + " holds \"" + it.key() + "\", which is not an IP address");
+        if (!it->is_object()) throw _sim.Error("field " + pointer + "/" + it.key() + " must be an object");
+        if (IpAddress(it.key()) == target) found = &*it;
+    }
+    return found;
+}
+
+bool NetworkView::IsOwnAddress(const std::string& v, const IpAddress& target) const {
+    if (!target.IsIpv6()) {
+        const std::string text = _sim.String(_view, v + "/ipv4/address");
+        if (!Ipv4Address::IsValidAddress(text))
+            throw _sim.Error("field " + v + "/ipv4/address is not an IPv4 address: \"" + text + "\"");
+        return !Ipv4Address(text).IsZero() && Ipv4Address(text) == target.V4();
+    }
+    if (!_sim.Bool(_view, "/network/ipv6Enabled")) return false;
+    for (const json& a : _sim.Array(_view, v + "/ipv6/addresses")) {
+        const std::string text = a.is_object() ? TextAt(a, "/address") : "";
+        if (Ipv6Address::IsValidAddress(text) && Ipv6Address(text) == target.V6()) return true;
+    }
+    return false;
+}
+
+const json* NetworkView::OnSegment(const std::string& v, const IpAddress& target) const {
+    const int vlan = Vlan(v);
+    if (vlan < 0) return nullptr;
+    const json* machine = Machine("/network/lan/" + std::to_string(vlan) + "/hosts", target);
+    if (machine == nullptr) return nullptr;
+    if (target.IsIpv6()) {
+        if (!_sim.Bool(_view, "/network/ipv6Enabled")) return nullptr;
+        return HasIpv6For(_sim.Array(_view, v + "/ipv6/addresses"), target.V6()) ? machine : nullptr;
+    }
+    const std::string address = _sim.String(_view, v + "/ipv4/address");
+    const std::string netmask = _sim.String(_view, v + "/ipv4/netmask");
+    if (!Ipv4Address::IsValidAddress(address) || !Ipv4Address::IsValidAddress(netmask))
+        throw _sim.Error("field " + v + "/ipv4 holds an address or netmask that is not IPv4");
+    if (Ipv4Address(address).IsZero()) return nullptr;
+    const uint32_t mask = Ipv4Address(netmask).GetHostOrder();
+    const bool same = (Ipv4Address(address).GetHostOrder() & mask) == (target.V4().GetHostOrder() & mask);
+    return same ? machine : nullptr;
+}
+
+const json* NetworkView::Reach(const std::string& v, const IpAddress& target) const {
+    static const json OWN = json::object();
+    if (!HasLink(v)) return nullptr;
+    if (IsOwnAddress(v, target)) return &OWN;
+    if (const json* machine = OnSegment(v, target)) return machine;
+    // Beyond the segment only through the default gateway of the family.
+    const json* remote = Machine("/network/remote", target);
+    if (remote == nullptr) return nullptr;
+    const std::string field =
+        target.IsIpv6() ? "/network/routing/ipv6Gateway" : "/network/routing/ipv4Gateway";
+    const std::string gateway = _sim.String(_view, field);
+    if (!IsIpText(gateway)) throw _sim.Error("field " + field + " is not an IP address: \"" + gateway + "\"");
+    const IpAddress router(gateway);
+    if (router.IsIpv6() != target.IsIpv6() || (router.IsIpv6() ? router.V6().IsZero() : router.V4().IsZero()))
+        return nullptr;
+    return OnSegment(v, router) != nullptr ? remote : nullptr;
+}
+
+std::vector<IpAddress> NetworkView::Resolve(const std::string& name) const {
+    if (name.empty()) return {};
+    const std::vector<IpAddress> found = FromHostsFile(name);
+    return found.empty() ? FromDns(name) : found;
+}
+
+std::vector<IpAddress> NetworkView::FromHostsFile(const std::string& name) const {
+    // A host without a hosts file (or an unreadable one) asks DNS, as
+    // resolvers do.
+    std::vector<IpAddress> found;
+    std::ifstream in(_sim.Root() + "/etc/hosts");
+    for (std::string line; std::getline(in, line);) {
+        std::istringstream fields(line.substr(0, line.find('#')));
+        std::string address, alias;
+        fields >> address;
+        bool named = false;
+        while (fields >> alias) named = named || SameName(alias, name);
+        if (named && IsIpText(address)) AddOnce(found, IpAddress(address));
+    }
+    return found;
+}
+
+std::vector<IpAddress> NetworkView::FromDns(const std::string& name) const {
+    const std::string vnic = _sim.String(_view, "/network/managementInterface");
+    const std::string v = vnic.empty() ? "" : Find("/network/vnics", vnic);
+    if (v.empty() || !_view.contains(json::json_pointer("/network/dnsZone"))) return {};
+    const json& zone = _sim.Object(_view, "/network/dnsZone");
+
+    std::vector<std::string> servers = _sim.StringList(_view, "/network/dns/servers");
+    for (const std::string& server : _sim.StringList(_view, "/network/dns/ipv6Servers"))
+        servers.push_back(server);
+    std::vector<std::string> candidates = {name};
+    if (name.find('.') == std::string::npos)
+        for (const std::string& domain : _sim.StringList(_view, "/network/dns/searchDomains"))
+            candidates.push_back(name + "." + domain);
+
+    for (const std::string& server : servers) {
+        if (!IsIpText(server)) throw _sim.Error("the name server \"" + server + "\" is not an IP address");
+        const json* machine = Reach(v, IpAddress(server));
+        if (machine == nullptr) continue;
+        const auto dns = machine->find("dns");
+        if (dns != machine->end() && !dns->is_boolean())
+            throw _sim.Error("the \"dns\" field of machine " + server + " must be true or false");
+        if (dns == machine->end() || !dns->get<bool>()) continue;
+        // The first name server that answers gives the answer.
+        std::vector<IpAddress> found;
+        for (const std::string& candidate : candidates) {
+            for (auto it = zone.begin(); it != zone.end(); ++it) {
+                std::string key = it.key();
+                if (!key.empty() && key.back() == '.') key.pop_back();
+                std::string wanted = candidate;
+                if (!wanted.empty() && wanted.back() == '.') wanted.pop_back();
+                if (!SameName(key, wanted)) continue;
+                if (!it->is_array())
+                    throw _sim.Error("field /network/dnsZone/" + it.key() + " must be an array");
+                for (const json& address : *it) {
+                    if (!address.is_string() || !IsIpText(address.get<std::string>()))
+                        throw _sim.Error("field /network/dnsZone/" + it.key() + " holds " + address.dump() +
+                                         ", which is not an IP address");
+                    AddOnce(found, IpAddress(address.get<std::string>()));
+                }
+            }
+            if (!found.empty()) break;
+        }
+        return found;
+    }
+    return {};
 }
 
 // ---- NetworkModel ----
@@ -610,6 +796,172 @@ void NetworkModel::RemoveDvsUplink(const std::string& dvs, const std::string& pn
     Object(port)["pnic"] = "";
 }
 
+void NetworkModel::SetConnectionPoint(const std::string& v, int type, const std::string& name) {
+    const std::string vnic = _sim.String(_view, v + "/name");
+    // The distributed port the interface leaves, when it is on one.
+    std::string oldPort;
+    if (_sim.Integer(_view, v + "/connectionType") == Network::ConnectionPoint::DvsPort) {
+        const std::string dvs = Find("/network/dvswitches", _sim.String(_view, v + "/dvs"));
+        if (!dvs.empty()) oldPort = Find(dvs + "/ports", _sim.String(_view, v + "/port"), "key");
+    }
+    std::string dvsName, port;
+    if (type == Network::ConnectionPoint::DvsPort) {
+        dvsName = ConnectionPointSwitch(type, name);
+        port = DvsPortPointer(DvsPointer(dvsName), name);
+        std::string user = _sim.String(_view, port + "/connectee");
+        const std::string list = "/network/vnics";
+        for (size_t i = 0; i < _sim.Array(_view, list).size() && user.empty(); ++i) {
+            const std::string other = ::HostCtl::Lib::At(list, i);
+            if (other != v &&
+                _sim.Integer(_view, other + "/connectionType") == Network::ConnectionPoint::DvsPort &&
+                _sim.String(_view, other + "/dvs") == dvsName && _sim.String(_view, other + "/port") == name)
+                user = _sim.String(_view, other + "/name");
+        }
+        if (!user.empty() && user != vnic)
+            throw HostCtlException("port \"" + name + "\" of distributed switch \"" + dvsName +
+                                   "\" is already used by \"" + user + "\"");
+    } else if (type == Network::ConnectionPoint::PortGroup) {
+        ConnectionPointSwitch(type, name);  // the port group must exist
+    } else {
+        throw HostCtlException(
+            "a virtual NIC connects to a port group (type 1) or a distributed port (type 2), "
+            "not to type " +
+            std::to_string(type));
+    }
+
+    if (!oldPort.empty() && _sim.String(_view, oldPort + "/connectee") == vnic)
+        Object(oldPort)["connectee"] = "";
+    json& nic = Object(v);
+    nic["connectionType"] = type;
+    if (type == Network::ConnectionPoint::PortGroup) {
+        nic.erase("dvs");
+        nic.erase("port");
+        nic["portgroup"] = name;
+    } else {
+        nic.erase("portgroup");
+        nic["dvs"] = dvsName;
+        nic["port"] = name;
+        Object(port)["connectee"] = vnic;
+    }
+}
+
+void NetworkModel::AddVirtualSwitch(const std::string& vswitch) {
+    if (vswitch.empty()) throw HostCtlException("a switch needs a name");
+    if (!Find("/network/vswitches", vswitch).empty() || !Find("/network/dvswitches", vswitch).empty())
+        throw HostCtlException("the host already has a switch named \"" + vswitch + "\"");
+    At("/network/vswitches")
+        .push_back({{"name", vswitch},
+                    {"uplinks", json::array()},
+                    {"maxActiveUplinks", 2},
+                    {"teaming", {{"active", json::array()}, {"standby", json::array()}}},
+                    {"portgroups", json::array()}});
+}
+
+void NetworkModel::AddPortGroup(const std::string& vswitch, const std::string& portGroup, unsigned vlan) {
+    const std::string sw = VswitchPointer(vswitch);
+    if (portGroup.empty()) throw HostCtlException("a port group needs a name");
+    if (vlan > 4095) throw HostCtlException("VLAN ID " + std::to_string(vlan) + " is above 4095");
+    const std::string list = "/network/vswitches";
+    for (size_t i = 0; i < _sim.Array(_view, list).size(); ++i) {
+        const std::string other = ::HostCtl::Lib::At(list, i);
+        if (!Find(other + "/portgroups", portGroup).empty())
+            throw HostCtlException("port group \"" + portGroup + "\" already exists on switch \"" +
+                                   _sim.String(_view, other + "/name") + "\"");
+    }
+    At(sw + "/portgroups").push_back({{"name", portGroup}, {"vlan", vlan}});
+}
+
+std::string NetworkModel::AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort) {
+    const std::string d = DvsPointer(dvs);
+    json port = _sim.Object(_view, DvsPortPointer(d, fromPort));
+    // A number above every numeric key of the switch's ports.
+    uint64_t highest = 99;
+    for (const char* list : {"/ports", "/uplinkPorts"}) {
+        for (size_t i = 0; i < _sim.Array(_view, d + list).size(); ++i) {
+            const std::string key = _sim.String(_view, ::HostCtl::Lib::At(d + list, i) + "/key");
+            if (!key.empty() && key.size() < 19 && key.find_first_not_of("0123456789") == std::string::npos)
+                highest = std::max<uint64_t>(highest, std::stoull(key));
+        }
+    }
+    const std::string key = std::to_string(highest + 1);
+    port["key"] = key;
+    port["hostLocal"] = true;
+    port["connectee"] = "";
+    At(d + "/ports").push_back(std::move(port));
+    return key;
+}
+
+void NetworkModel::ClearConfig() {
+    const std::string dumper = _sim.String(_view, "/network/netDumper/interface");
+    if (_sim.Bool(_view, "/network/netDumper/enabled") && !dumper.empty())
+        throw HostCtlException("the network core dump sender is enabled on \"" + dumper +
+                               "\": disable it first");
+    for (const char* list : {"/network/vnics", "/network/vswitches", "/network/dvswitches"}) {
+        _sim.Array(_view, list);
+        At(list) = json::array();
+    }
+    Object("/network")["managementInterface"] = "";
+    for (const char* routing : {"/network/routing", "/network/saved/routing"}) {
+        json& r = Object(routing);
+        r["ipv4Gateway"] = "0.0.0.0";
+        r["ipv6Gateway"] = "::";
+    }
+    for (const char* dns : {"/network/dns", "/network/saved/dns"}) {
+        json& d = Object(dns);
+        d["servers"] = json::array();
+        d["ipv6Servers"] = json::array();
+    }
+}
+
+void NetworkModel::AutoConfig() {
+    const std::pair<const char*, const char*> parts[] = {{"/network/vnics", "virtual NICs"},
+                                                         {"/network/vswitches", "standard switches"},
+                                                         {"/network/dvswitches", "distributed switches"}};
+    for (const auto& [list, what] : parts)
+        if (!_sim.Array(_view, list).empty())
+            throw HostCtlException(std::string("the network is not clear: the host still has ") + what);
+    std::string names[3];
+    const char* const fields[3] = {"/network/factory/vswitch", "/network/factory/portgroup",
+                                   "/network/factory/vnic"};
+    for (int i = 0; i < 3; ++i) {
+        names[i] = _sim.String(_view, fields[i]);
+        if (names[i].empty()) throw _sim.Error(std::string("field ") + fields[i] + " may not be empty");
+    }
+    const std::string pnics = "/network/pnics";
+    if (_sim.Array(_view, pnics).empty())
+        throw HostCtlException("the host has no physical NIC to configure the network on");
+    // The first NIC with link; without any, the first NIC.
+    std::string uplink = ::HostCtl::Lib::At(pnics, 0);
+    for (size_t i = _sim.Array(_view, pnics).size(); i-- > 0;)
+        if (_sim.Bool(_view, ::HostCtl::Lib::At(pnics, i) + "/linkUp")) uplink = ::HostCtl::Lib::At(pnics, i);
+    const std::string pnic = _sim.String(_view, uplink + "/name");
+    const std::string mac = _sim.String(_view, uplink + "/mac");
+    if (!ParseMac(mac)) throw _sim.Error("field " + uplink + "/mac is not a MAC address: \"" + mac + "\"");
+
+    At("/network/vswitches")
+        .push_back({{"name", names[0]},
+                    {"uplinks", json::array({pnic})},
+                    {"maxActiveUplinks", 2},
+                    {"teaming", {{"active", json::array({pnic})}, {"standby", json::array()}}},
+                    {"portgroups", json::array({{{"name", names[1]}, {"vlan", 0}}})}});
+    At("/network/vnics")
+        .push_back(
+            {{"name", names[2]},
+             {"mac", Lower(mac)},
+             {"enabled", true},
+             {"dhcpDns", true},
+             {"connectionType", Network::ConnectionPoint::PortGroup},
+             {"portgroup", names[1]},
+             {"ipv4", {{"dhcp", true}, {"none", false}, {"address", "0.0.0.0"}, {"netmask", "0.0.0.0"}}},
+             {"ipv6",
+              {{"dhcp", false},
+               {"routerAdvertisement", true},
+               {"static", json::array()},
+               {"addresses", json::array()}}}});
+    Object("/network")["managementInterface"] = names[2];
+    Configure("/network/vnics/0");
+}
+
 // ---- Booting and the hosts file ----
 
 void BootNetwork(const SimState& sim, json& state) {
@@ -641,19 +993,11 @@ void BootSimulatedHost(const std::string& root) {
 }
 
 std::string HostsFileEntry(const json& state) {
-    const std::string vnic = TextAt(state, "/network/managementInterface");
     const std::string hostname = TextAt(state, "/network/dns/hostname");
     const std::string domain = TextAt(state, "/network/dns/domain");
-    if (vnic.empty() || hostname.empty() || !state.contains(json::json_pointer("/network/vnics"))) return "";
-    const json& vnics = state.at(json::json_pointer("/network/vnics"));
-    if (!vnics.is_array()) return "";
-    for (const json& v : vnics) {
-        if (!v.is_object() || v.value("name", json()) != vnic) continue;
-        const std::string address = TextAt(v, "/ipv4/address");
-        if (!Ipv4Address::IsValidAddress(address) || Ipv4Address(address).IsZero()) return "";
-        return address + "\t" + (domain.empty() ? hostname : hostname + "." + domain + " " + hostname);
-    }
-    return "";
+    const std::string address = ManagementIpv4(state);
+    if (hostname.empty() || address.empty()) return "";
+    return address + "\t" + (domain.empty() ? hostname : hostname + "." + domain + " " + hostname);
 }
 
 void SyncHostsFile(const std::string& root, const json& state, const std::vector<std::string>& formerNames) {
@@ -694,38 +1038,35 @@ void SyncHostsFile(const std::string& root, const json& state, const std::vector
     }
 
     if (mkdir(dir.c_str(), 0755) < 0 && errno != EEXIST) throw fail("cannot create its folder", errno);
-    std::string tmp = path + ".XXXXXX";
-    const int fd = mkostemp(tmp.data(), O_CLOEXEC);
-    if (fd < 0) throw fail("cannot create a temporary file", errno);
-    size_t done = 0;
-    while (done < text.size()) {
-        const ssize_t n = write(fd, text.data() + done, text.size() - done);
-        if (n < 0 && errno == EINTR) continue;
-        if (n < 0) {
-            const int err = errno;
-            close(fd);
-            unlink(tmp.c_str());
-            throw fail("cannot write", err);
-        }
-        done += size_t(n);
+    ReplaceFile(path, text, 0644);
+}
+
+json ReachableHost(const SimState& sim, const json& state, const std::string& vnic,
+                   const std::string& target) {
+    if (!IsIpText(target)) throw HostCtlException("\"" + target + "\" is not an IP address");
+    try {
+        const NetworkView view(sim, state);
+        const json* machine = view.Reach(view.VnicPointer(vnic), IpAddress(target));
+        return machine != nullptr ? *machine : json();
+    } catch (const json::exception& e) {
+        const std::string what = e.what();
+        const size_t tagEnd = what.find("] ");
+        throw sim.Error(tagEnd == std::string::npos ? what : what.substr(tagEnd + 2));
     }
-    if (fchmod(fd, 0644) < 0 || fsync(fd) < 0) {
-        const int err = errno;
-        close(fd);
-        unlink(tmp.c_str());
-        throw fail("cannot write", err);
-    }
-    close(fd);
-    if (rename(tmp.c_str(), path.c_str()) < 0) {
-        const int err = errno;
-        unlink(tmp.c_str());
-        throw fail("cannot replace", err);
-    }
-    const int dirFd = open(dir.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (dirFd >= 0) {
-        fsync(dirFd);
-        close(dirFd);
-    }
+}
+
+void RegisterHostInDnsZone(json& state) {
+    const std::string hostname = TextAt(state, "/network/dns/hostname");
+    const std::string domain = TextAt(state, "/network/dns/domain");
+    if (hostname.empty() || !state.is_object() || !state["network"].is_object()) return;
+    json& zone = state["network"]["dnsZone"];
+    if (!zone.is_object()) zone = json::object();
+    const std::string fqdn = domain.empty() ? hostname : hostname + "." + domain;
+    const std::string address = ManagementIpv4(state);
+    if (address.empty())
+        zone.erase(fqdn);
+    else
+        zone[fqdn] = json::array({address});
 }
 
 }  // namespace HostCtl::Lib

@@ -26,6 +26,7 @@ public:
     std::string VswitchPointer(const std::string& vswitch) const;
     std::string PortGroupPointer(const std::string& vswitchPointer, const std::string& portGroup) const;
     std::string DvsPointer(const std::string& dvs) const;
+    std::string DvsPortPointer(const std::string& dvsPointer, const std::string& port) const;
 
     // The switch that holds a connection point (ConnectionPoint::Type and its
     // name); throws when none does or the type has no switch on the host.
@@ -40,11 +41,36 @@ public:
     // when it is connected to neither.
     int Vlan(const std::string& vnicPointer) const;
 
+    // The machine that answers `target` from the virtual NIC: its entry in
+    // "network/lan/<vlan>/hosts" or "network/remote" (an empty object for one
+    // of the interface's own addresses), or null when nothing answers. The
+    // interface needs link; a machine of its VLAN answers when the interface
+    // has an address of the target's kind that reaches it (IPv4: the same
+    // subnet; IPv6: any address for a link-local target, a global one
+    // otherwise), a remote machine when the default gateway of its family
+    // answers that way.
+    const nlohmann::json* Reach(const std::string& vnicPointer, const Network::IpAddress& target) const;
+    // The host resolver: the hosts file of the host's root first (a line
+    // naming `name`, letter case aside), else the DNS zone of the simulated
+    // network ("network/dnsZone"), asked through the first configured name
+    // server that is a DNS server answering from the management interface.
+    // Names without a dot are also tried with each search domain there.
+    // Empty when the name does not resolve.
+    std::vector<Network::IpAddress> Resolve(const std::string& name) const;
+
 protected:
     // The pointer of the member of `list` whose "name" (or `key`) is `name`,
     // or "" when none is.
     std::string Find(const std::string& list, const std::string& name, const char* key = "name") const;
     bool PnicHasLink(const std::string& pnic) const;
+    // The entry of `target` in the object of machines at `pointer` (keyed by
+    // address), or null.
+    const nlohmann::json* Machine(const std::string& pointer, const Network::IpAddress& target) const;
+    bool IsOwnAddress(const std::string& vnicPointer, const Network::IpAddress& target) const;
+    // The machine of the interface's VLAN segment that its addresses reach.
+    const nlohmann::json* OnSegment(const std::string& vnicPointer, const Network::IpAddress& target) const;
+    std::vector<Network::IpAddress> FromHostsFile(const std::string& name) const;
+    std::vector<Network::IpAddress> FromDns(const std::string& name) const;
 
     const SimState& _sim;
     const nlohmann::json& _view;
@@ -79,6 +105,29 @@ public:
     void RemoveUplink(const std::string& vswitch, const std::string& pnic);
     void SetPortGroupVlan(const std::string& vswitch, const std::string& portGroup, unsigned vlan);
     void RemoveDvsUplink(const std::string& dvs, const std::string& pnic);
+
+    // Connects the interface to a port group of a standard switch (type 1)
+    // or to a free port of a distributed switch (type 2), whose connectee
+    // follows. Its IP configuration and addresses stay: the new network is
+    // seen when the interface is configured, renewed or enabled next.
+    void SetConnectionPoint(const std::string& vnicPointer, int type, const std::string& name);
+    // A standard switch without uplinks or port groups.
+    void AddVirtualSwitch(const std::string& vswitch);
+    // Port group names are unique on the host.
+    void AddPortGroup(const std::string& vswitch, const std::string& portGroup, unsigned vlan);
+    // A copy of the port `fromPort` that lives on this host only, with a new
+    // key and nothing connected; returns the key.
+    std::string AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort);
+    // Removes every virtual NIC, standard and distributed switch, the
+    // management interface name, the default gateways and the name servers
+    // (running and saved); refused while the network core dump sender is
+    // enabled on an interface.
+    void ClearConfig();
+    // On a clear network: the network of a freshly installed host
+    // ("network/factory"), a standard switch on the first NIC with link, its
+    // management port group and interface (that NIC's MAC, DHCP with DNS,
+    // router advertisements), configured at once.
+    void AutoConfig();
 
 private:
     nlohmann::json& At(const std::string& pointer);

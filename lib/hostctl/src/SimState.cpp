@@ -96,9 +96,26 @@ bool WriteAll(int fd, const std::string& data) {
 //   "last", "netmask", "gateway", "dns", "domain", and its "leases" by MAC), an
 //   IPv6 router "routerAdvertisement" ("prefix", "prefixLength", the "router"
 //   address) and a DHCPv6 server "dhcpv6" ("first", "last", "dns", "leases").
+//   "hosts" are the machines on the VLAN's segment, by address: {"dns": true
+//   for a DNS server, "delayMs": how long its answer to a ping takes}.
+// - "remote": the machines beyond the routers, in the same shape; reached
+//   through the default gateway. "dnsZone": what the network's DNS servers
+//   answer, {"name": ["address", ...]}. "pingTimeoutMs": how long qelping
+//   waits for an answer that never comes.
+// - "netDumper": the network core dump sender, "enabled" on "interface"; the
+//   network configuration cannot be cleared while it holds one.
+// - "factory": the names of a freshly installed host's network: its standard
+//   switch "vswitch", management port group "portgroup" and interface "vnic".
 //
 // "faults": {operation: message}: the simulated backend's operation of that
 // name (a Backend method name) fails with the message and changes nothing.
+//
+// Services and firewall: "services" holds the local shell ("tarnShell") and
+// SSH ("ssh"), each "running" now and "enabled" (started with the host);
+// "hostAgent"/"running" is false while the management agents are stopped;
+// "firewall"/"rulesets" holds each ruleset by id with its "enabled" flag.
+// "toolFaults" and "toolDelays" (set by velk-simhost fail and slow) make the
+// host's tools fail or take their time.
 //
 // Elsewhere: a smart-card slot's "token" is null when the slot is empty, else
 // {"label": text, "userIds": [text, ...]}; advanced options hold an integer or
@@ -153,15 +170,23 @@ const char* const DEFAULT_STATE = R"({
     "lan": {
       "0": {"dhcp": {"first": "192.0.2.100", "last": "192.0.2.199", "netmask": "255.255.255.0",
                      "gateway": "192.0.2.1", "dns": ["192.0.2.53"], "domain": "example.test",
-                     "leases": {"00:50:56:01:00:02": "192.0.2.100"}}},
+                     "leases": {"00:50:56:01:00:02": "192.0.2.100"}},
+            "hosts": {"192.0.2.1": {}, "192.0.2.53": {"dns": true}}},
       "20": {"dhcp": {"first": "198.51.100.100", "last": "198.51.100.199", "netmask": "255.255.255.0",
                       "gateway": "198.51.100.1", "dns": ["198.51.100.53"], "domain": "example.test",
                       "leases": {}},
              "routerAdvertisement": {"prefix": "2001:db8:20::", "prefixLength": 64, "router": "fe80::1"},
              "dhcpv6": {"first": "2001:db8:20::1000", "last": "2001:db8:20::10ff", "dns": ["2001:db8:20::53"],
-                        "leases": {}}},
+                        "leases": {}},
+             "hosts": {"198.51.100.1": {}, "198.51.100.53": {"dns": true}, "fe80::1": {},
+                       "2001:db8:20::53": {"dns": true}}},
       "30": {}
-    }
+    },
+    "remote": {"203.0.113.10": {}, "203.0.113.53": {"dns": true}},
+    "dnsZone": {"www.example.test": ["203.0.113.10"]},
+    "pingTimeoutMs": 1000,
+    "netDumper": {"enabled": true, "interface": "qk0"},
+    "factory": {"vswitch": "kSwitch0", "portgroup": "Management Network", "vnic": "qk0"}
   },
   "faults": {},
   "system": {
@@ -185,8 +210,9 @@ const char* const DEFAULT_STATE = R"({
     "Zolva_HHRCWrapperSoftwareIdentity": {"VersionString": "3.0.0"},
     "CIM_Chassis": {"OtherIdentifyingInfo": "ASSET-0042"}
   },
-  "hostAgent": {"lockdownEnabled": false, "lockdownPossible": true, "users": ["root", "velk"]},
+  "hostAgent": {"lockdownEnabled": false, "lockdownPossible": true, "users": ["root", "velk"], "running": true},
   "services": {"ssh": {"enabled": false, "running": false}, "tarnShell": {"enabled": false, "running": false}},
+  "firewall": {"rulesets": {"sshServer": {"enabled": false}}},
   "vms": {"running": 0},
   "driverVm": {"state": 0, "devices": [
     {"id": "0000:03:00.0", "name": "Acme SATA Controller", "owned": false, "group": "g1"},
@@ -275,6 +301,15 @@ void SimState::Update(const std::function<void(json&)>& change,
     change(state);
     WriteLocked(state);
     if (afterWrite) afterWrite(state);
+}
+
+void SimState::WithLock(const std::function<void()>& work) {
+    Fd lockFd(open(LockPath().c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0644));
+    if (lockFd.get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
+    while (flock(lockFd.get(), LOCK_EX) < 0) {
+        if (errno != EINTR) throw HostCtlException(LockPath() + ": cannot lock: " + ErrnoText(errno));
+    }
+    work();
 }
 
 void SimState::Replace(const json& state) {
@@ -414,6 +449,7 @@ json DefaultHostState(const std::string& hostname) {
     }
     // What the host obtains from its network is derived as a boot derives it.
     BootNetwork(SimState("."), state);
+    RegisterHostInDnsZone(state);
     return state;
 }
 

@@ -80,6 +80,26 @@ public:
     std::vector<Network::DistributedSwitch::UplinkPort> GetDvsUplinkPorts(const std::string&) override {
         Unavailable("listing a distributed switch's uplink ports");
     }
+    void SetVnicConnectionPoint(const std::string&, const Network::ConnectionPoint&) override {
+        Unavailable("connecting a virtual NIC");
+    }
+    std::vector<std::string> GetVnicNames() override { Unavailable("listing the virtual NICs"); }
+    void AddVirtualSwitch(const std::string&) override { Unavailable("creating a virtual switch"); }
+    void AddPortGroup(const std::string&, const std::string&, uint16_t) override {
+        Unavailable("creating a port group");
+    }
+    uint16_t GetDvsPortVlanId(const std::string&, const std::string&) override {
+        Unavailable("reading a distributed port's VLAN");
+    }
+    std::string AddDvsHostLocalPort(const std::string&, const std::string&) override {
+        Unavailable("creating a host-local distributed port");
+    }
+    void DisableNetDumper() override { Unavailable("disabling the network core dump sender"); }
+    void ClearNetworkConfig() override { Unavailable("clearing the network configuration"); }
+    void AutoConfigNetwork() override { Unavailable("configuring the network automatically"); }
+    std::vector<Network::IpAddress> ResolveHostName(const std::string&) override {
+        Unavailable("resolving a host name");
+    }
     void RemoveDvsUplink(const std::string&, const std::string&) override {
         Unavailable("removing an uplink from a distributed switch");
     }
@@ -140,6 +160,13 @@ public:
     void SetDriverVmOwned(const std::vector<std::string>&) override {
         Unavailable("setting the driver VM devices");
     }
+
+    // Services and firewall.
+    bool GetFirewallRulesetEnabled(const std::string&) override { Unavailable("reading a firewall ruleset"); }
+    void SetFirewallRulesetEnabled(const std::string&, bool) override {
+        Unavailable("setting a firewall ruleset");
+    }
+    int RunCommandLine(const std::string&, bool, bool) override { Unavailable("running a command line"); }
 };
 
 }  // namespace

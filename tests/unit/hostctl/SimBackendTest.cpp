@@ -1,6 +1,7 @@
 // The host control operations on a simulated host: what one write leaves for
 // the next read, and the packing of the version record.
 #include <cstring>
+#include <filesystem>
 
 #include "TestSupport.hpp"
 #include "UnsupportedHostBackend.hpp"
@@ -321,13 +322,20 @@ using nlohmann::json;
 class FaultTest : public HostCtlTest::SimHostTest {
 protected:
     // The default host with a distributed switch, where every operation of
-    // the table below succeeds.
-    void Reset() {
+    // the table below succeeds (building the factory network needs a clear
+    // one, clearing it a disabled core dump sender).
+    void Reset(const std::string& operation) {
         json state = HostCtl::Lib::DefaultHostState();
         state["network"]["dvswitches"] = json::array(
             {{{"name", "kDS-1"},
               {"uplinkPorts", {{{"key", "uplink1"}, {"pnic", "zonic3"}}}},
               {"ports", {{{"key", "100"}, {"vlan", 0}, {"hostLocal", false}, {"connectee", ""}}}}}});
+        state["network"]["netDumper"]["enabled"] = false;
+        if (operation == "AutoConfigNetwork") {
+            for (const char* list : {"vnics", "vswitches", "dvswitches"})
+                state["network"][list] = json::array();
+            state["network"]["managementInterface"] = "";
+        }
         HostCtl::Lib::SimState(Root()).Replace(state);
         std::filesystem::create_directories(Root() + "/etc");
         HostCtlTest::WriteFile(Root() + "/etc/hosts", "192.0.2.100\thost1.example.test host1\n");
@@ -352,6 +360,9 @@ TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
         {"GetVnicIpConfig", [](Backend& b) { b.GetVnicIpConfig("qk0"); }},
         {"SetVnicIpConfig", [&](Backend& b) { b.SetVnicIpConfig("qk0", dhcp); }},
         {"GetVnicConnectionPoint", [](Backend& b) { b.GetVnicConnectionPoint("qk0"); }},
+        {"SetVnicConnectionPoint",
+         [](Backend& b) { b.SetVnicConnectionPoint("qk0", HostCtl::Network::ConnectionPoint(2, "100")); }},
+        {"GetVnicNames", [](Backend& b) { b.GetVnicNames(); }},
         {"GetVnicMacAddress", [](Backend& b) { b.GetVnicMacAddress("qk0"); }},
         {"SetVnicMacAddress", [](Backend& b) { b.SetVnicMacAddress("qk0", "00:50:56:01:00:09"); }},
         {"RenewVnicDhcpLease", [](Backend& b) { b.RenewVnicDhcpLease("qk0"); }},
@@ -363,6 +374,7 @@ TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
              b.GetConnectionPointSwitch(HostCtl::Network::ConnectionPoint(1, "Management Network"));
          }},
         {"GetVirtualSwitchNames", [](Backend& b) { b.GetVirtualSwitchNames(); }},
+        {"AddVirtualSwitch", [](Backend& b) { b.AddVirtualSwitch("kSwitch2"); }},
         {"GetVirtualSwitchUplinks", [](Backend& b) { b.GetVirtualSwitchUplinks("kSwitch0"); }},
         {"GetTeamingPolicy", [](Backend& b) { b.GetTeamingPolicy("kSwitch0"); }},
         {"GetMaxActiveUplinks", [](Backend& b) { b.GetMaxActiveUplinks("kSwitch0"); }},
@@ -371,12 +383,19 @@ TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
         {"RemoveUplinkFromTeamingPolicy",
          [](Backend& b) { b.RemoveUplinkFromTeamingPolicy("kSwitch1", "zonic2"); }},
         {"GetPortGroupNames", [](Backend& b) { b.GetPortGroupNames("kSwitch0"); }},
+        {"AddPortGroup", [](Backend& b) { b.AddPortGroup("kSwitch1", "Lab", 5); }},
         {"GetPortGroupVlanId", [](Backend& b) { b.GetPortGroupVlanId("kSwitch0", "Management Network"); }},
         {"SetPortGroupVlanId",
          [](Backend& b) { b.SetPortGroupVlanId("kSwitch0", "Management Network", 20); }},
         {"GetDistributedSwitchNames", [](Backend& b) { b.GetDistributedSwitchNames(); }},
         {"GetDvsUplinkPorts", [](Backend& b) { b.GetDvsUplinkPorts("kDS-1"); }},
         {"RemoveDvsUplink", [](Backend& b) { b.RemoveDvsUplink("kDS-1", "zonic3"); }},
+        {"GetDvsPortVlanId", [](Backend& b) { b.GetDvsPortVlanId("kDS-1", "100"); }},
+        {"AddDvsHostLocalPort", [](Backend& b) { b.AddDvsHostLocalPort("kDS-1", "100"); }},
+        {"DisableNetDumper", [](Backend& b) { b.DisableNetDumper(); }},
+        {"ClearNetworkConfig", [](Backend& b) { b.ClearNetworkConfig(); }},
+        {"AutoConfigNetwork", [](Backend& b) { b.AutoConfigNetwork(); }},
+        {"ResolveHostName", [](Backend& b) { b.ResolveHostName("www.example.test"); }},
         {"GetDns", [&](Backend& b) { b.GetDns(stack); }},
         {"SetHostname", [&](Backend& b) { b.SetHostname(stack, "esx7", true); }},
         {"SetFqdn", [&](Backend& b) { b.SetFqdn(stack, "esx7", "lab.test", true); }},
@@ -410,6 +429,17 @@ TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
         {"GetDriverVmState", [](Backend& b) { b.GetDriverVmState(); }},
         {"GetDriverVmDevices", [](Backend& b) { b.GetDriverVmDevices(); }},
         {"SetDriverVmOwned", [](Backend& b) { b.SetDriverVmOwned({}); }},
+        // Services and firewall.
+        {"GetFirewallRulesetEnabled", [](Backend& b) { b.GetFirewallRulesetEnabled("sshServer"); }},
+        {"SetFirewallRulesetEnabled", [](Backend& b) { b.SetFirewallRulesetEnabled("sshServer", true); }},
+        {"RunCommandLine",
+         [&](Backend& b) {
+             // The host's shell is the machine's.
+             std::filesystem::create_directories(Root() + "/bin");
+             std::error_code ec;
+             std::filesystem::create_symlink("/bin/sh", Root() + "/bin/sh", ec);
+             b.RunCommandLine("true", false, true);
+         }},
     };
     // The table covers every operation the backend lists, in its order.
     std::vector<std::string> names;
@@ -419,7 +449,7 @@ TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
     Backend& backend = HostCtl::Lib::GetBackend();
     for (const auto& [name, call] : calls) {
         SCOPED_TRACE(name);
-        Reset();
+        Reset(name);
         const std::string message = "injected failure of " + name;
         Edit([&](json& s) { s["faults"][name] = message; });
         const std::string state = HostCtlTest::ReadFile(StatePath());
@@ -438,7 +468,7 @@ TEST_F(FaultTest, EveryOperationFailsAsToldAndChangesNothing) {
         EXPECT_NO_THROW(call(backend));
     }
 
-    Reset();
+    Reset("");
     Edit([](json& s) { s["faults"] = "GetPnics"; });
     EXPECT_THROW(backend.GetPnics(), HostCtlException);
 }

@@ -77,6 +77,11 @@ TEST_F(SimHostNetwork, ShapesGiveConsistentHosts) {
             EXPECT_EQ(qk0["dvs"], "kDS-1");
             EXPECT_EQ(qk0["port"], "100");
             EXPECT_TRUE(network["vswitches"][0]["uplinks"].empty());
+            // The kDS restore's steps: a host-local copy of the port, the interface moved onto it.
+            const auto backend = HostCtl::Lib::MakeSimulatedBackend(root);
+            const std::string key = backend->AddDvsHostLocalPort("kDS-1", "100");
+            backend->SetVnicConnectionPoint("qk0", HostCtl::Network::ConnectionPoint(2, key));
+            EXPECT_EQ(backend->GetDvsPortVlanId("kDS-1", key), 0);
         } else {
             EXPECT_EQ(Strings(network["vswitches"][0]["teaming"]["active"]), c.managementUplinks);
         }
@@ -89,6 +94,12 @@ TEST_F(SimHostNetwork, ShapesGiveConsistentHosts) {
                 if (port["pnic"] != "") attached.push_back(port["pnic"]);
         std::sort(attached.begin(), attached.end());
         EXPECT_EQ(std::adjacent_find(attached.begin(), attached.end()), attached.end());
+
+        // The network's DNS knows the host by the address it was created with.
+        const json zone = network["dnsZone"];
+        const bool addressed = std::string(c.address) != "0.0.0.0";
+        EXPECT_EQ(zone.value("esx1.lab.test", json()), addressed ? json({c.address}) : json()) << zone;
+        EXPECT_EQ(zone["www.example.test"], json({"203.0.113.10"}));
 
         // The hosts file has the host's line exactly while it has an address.
         const std::string hosts = ReadFile(root + "/etc/hosts");

@@ -69,6 +69,8 @@ public:
     // autoconfigured IPv6 addresses obtained as the configuration asks.
     virtual void SetVnicIpConfig(const std::string& vnic, const Network::IpConfig& config) = 0;
     virtual Network::ConnectionPoint GetVnicConnectionPoint(const std::string& vnic) = 0;
+    virtual void SetVnicConnectionPoint(const std::string& vnic, const Network::ConnectionPoint& point) = 0;
+    virtual std::vector<std::string> GetVnicNames() = 0;
     virtual std::string GetVnicMacAddress(const std::string& vnic) = 0;
     virtual void SetVnicMacAddress(const std::string& vnic, const std::string& mac) = 0;
     virtual void RenewVnicDhcpLease(const std::string& vnic) = 0;
@@ -81,6 +83,7 @@ public:
     // Switches.
     virtual std::string GetConnectionPointSwitch(const Network::ConnectionPoint& point) = 0;
     virtual std::vector<std::string> GetVirtualSwitchNames() = 0;
+    virtual void AddVirtualSwitch(const std::string& vswitch) = 0;
     virtual std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) = 0;
     virtual Network::TeamingPolicy GetTeamingPolicy(const std::string& vswitch) = 0;
     virtual unsigned GetMaxActiveUplinks(const std::string& vswitch) = 0;
@@ -88,12 +91,23 @@ public:
                                           bool standby) = 0;
     virtual void RemoveUplinkFromTeamingPolicy(const std::string& vswitch, const std::string& pnic) = 0;
     virtual std::vector<std::string> GetPortGroupNames(const std::string& vswitch) = 0;
+    virtual void AddPortGroup(const std::string& vswitch, const std::string& portGroup, uint16_t vlanId) = 0;
     virtual uint16_t GetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup) = 0;
     virtual void SetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup,
                                     uint16_t vlanId) = 0;
     virtual std::vector<std::string> GetDistributedSwitchNames() = 0;
     virtual std::vector<Network::DistributedSwitch::UplinkPort> GetDvsUplinkPorts(const std::string& dvs) = 0;
     virtual void RemoveDvsUplink(const std::string& dvs, const std::string& pnic) = 0;
+    virtual uint16_t GetDvsPortVlanId(const std::string& dvs, const std::string& port) = 0;
+    // Returns the new port's key.
+    virtual std::string AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort) = 0;
+
+    // The factory restore of the network (see QelCtl::Network::NetworkInfoImpl).
+    virtual void DisableNetDumper() = 0;
+    virtual void ClearNetworkConfig() = 0;
+    virtual void AutoConfigNetwork() = 0;
+    // The host resolver's answer for `name`: hosts file, then name servers.
+    virtual std::vector<Network::IpAddress> ResolveHostName(const std::string& name) = 0;
 
     // Name service and routing of a network stack ("defaultTcpipStack").
     // `persist` also writes the saved configuration the host boots with.
@@ -139,6 +153,20 @@ public:
     virtual int GetDriverVmState() = 0;
     virtual std::vector<QelCtl::Hardware::DriverVmDevice> GetDriverVmDevices() = 0;
     virtual void SetDriverVmOwned(const std::vector<std::string>& ownedIds) = 0;
+
+    // Services and firewall.
+    // Whether the firewall ruleset `id` ("sshServer") lets its traffic in; an
+    // unknown id throws.
+    virtual bool GetFirewallRulesetEnabled(const std::string& id) = 0;
+    virtual void SetFirewallRulesetEnabled(const std::string& id, bool enabled) = 0;
+    // Runs `commandLine` through the host's shell ("/bin/sh -c"); absolute
+    // paths in it are host paths. With `logOutput` every line the command
+    // prints goes to the system log, otherwise its output is dropped. With
+    // `wait` the result is the command's exit status (128 + the signal number
+    // when a signal ended it); without, the command is left running on its
+    // own (its output dropped) and the result is 0 once it has started.
+    // Throws when the shell cannot be started.
+    virtual int RunCommandLine(const std::string& commandLine, bool logOutput, bool wait) = 0;
 };
 
 // The process's backend, chosen by InitHost() (called on first use).

@@ -2,6 +2,8 @@
 // absolute host paths, and the one function through which syslog lines go.
 #pragma once
 
+#include <sys/types.h>
+
 #include <cstdarg>
 #include <string>
 
@@ -44,6 +46,13 @@ void OpenLog(const char* ident, int option, int facility);
 // program's short name. errno is the same after the call as before it.
 void Syslog(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
 void VSyslog(int priority, const char* format, va_list args);
+
+// Replaces the file at `path` as a whole with `text` and permissions `mode`:
+// the text goes to a temporary file in the same folder, which is flushed to
+// disk and renamed over `path`, and the folder is flushed too. Readers see
+// the old file or the new one, never a part; after a failure (or a kill) the
+// old file is still there. Throws HostCtlException naming the file.
+void ReplaceFile(const std::string& path, const std::string& text, mode_t mode);
 
 // The time now as "2026-11-23T08:15:02.345Z" (UTC, milliseconds), the stamp
 // of the simulated host's log lines.

@@ -195,6 +195,9 @@ public:
     // DHCP lease and autoconfigured IPv6 addresses are obtained as asked.
     void SetIpConfig(const IpConfig& cfg);
     ConnectionPoint GetConnectionPoint() const;
+    // Connects the interface to a port group (type 1, by name) or a
+    // distributed port (type 2, by key); its IP configuration stays.
+    void SetConnectionPoint(const ConnectionPoint& point);
     std::string GetMacAddress() const;
     void SetMacAddress(const std::string& mac);
     // Asks the DHCP servers (DHCPv4 and, when used, DHCPv6) for a lease again.
@@ -233,6 +236,7 @@ public:
     // Takes the NIC out of the teaming policy and off the switch.
     void RemoveUplinkFromTeamingPolicy(const std::string& pnic);
     std::vector<std::string> GetPortGroupNames() const;
+    void AddPortGroup(const std::string& portGroup, uint16_t vlanId);
     // 0 when the port group has no VLAN, 4095 for all VLANs.
     uint16_t GetPortGroupVlanId(const std::string& portGroup) const;
     void SetPortGroupVlanId(const std::string& portGroup, uint16_t vlanId);
@@ -258,6 +262,11 @@ public:
     std::vector<std::string> GetUsedUplinks() const;
     // Frees the uplink port the NIC backs.
     void RemoveUplink(const std::string& pnic);
+    // The VLAN of one of the switch's ports (0: none, 4095: all).
+    uint16_t GetPortVlanId(const std::string& portKey) const;
+    // Creates a port that lives on this host only, with the VLAN and the
+    // other properties of `fromPortKey`; returns its key.
+    std::string AddHostLocalPort(const std::string& fromPortKey);
 
 private:
     std::string _name;
@@ -301,5 +310,25 @@ private:
 };
 
 }  // namespace Adv
+
+// Services and firewall.
+namespace Firewall {
+
+// A ruleset of the host's firewall, as found by id
+// (QelCtl::System::SystemInfoImpl::GetFirewallRulesetById).
+class Ruleset {
+public:
+    Ruleset(std::string id, bool enabled) : _id(std::move(id)), _enabled(enabled) {}
+    const std::string& GetId() const { return _id; }
+    // Whether the ruleset let its traffic in when it was found or last set.
+    bool IsEnabled() const { return _enabled; }
+    void SetEnabled(bool enabled);  // writes to the host
+
+private:
+    std::string _id;
+    bool _enabled;
+};
+
+}  // namespace Firewall
 
 }  // namespace HostCtl

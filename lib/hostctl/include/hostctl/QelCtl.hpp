@@ -118,6 +118,18 @@ public:
     bool IsQelIpv6Enabled();
     // Turns IPv6 on or off for the next boot of the host.
     void SetQelIpv6Enabled(bool enabled);
+    // Names of the host kernel's virtual NICs.
+    std::vector<std::string> GetVirtualNicNames();
+
+    // The factory restore of the network, in this order: the network core
+    // dump sender lets go of the management interface, the whole network
+    // configuration (virtual NICs, switches, port groups, routes, name
+    // servers) is removed, and the network is configured as on a freshly
+    // installed host (a standard switch on the first connected NIC, its
+    // management port group and interface, DHCP).
+    void DisableNetDumper();
+    void ClearNetworkConfig();
+    void AutoConfigNetwork();
 
 private:
     bool _updated = false;
@@ -180,6 +192,26 @@ class VirtualSwitchInfoImpl {
 public:
     // Names of the host's standard virtual switches.
     std::vector<std::string> GetVirtualSwitchNames();
+    // Creates a standard switch without uplinks or port groups.
+    void AddVirtualSwitch(const std::string& name);
+};
+
+// The host's hosts file ("/etc/hosts").
+class HostsFile {
+public:
+    // Removes `hostName` from every line that names it; a line left without
+    // names goes away. Other lines stay as they are. The file is replaced as
+    // a whole. Throws HostCtlException when it cannot be read or written.
+    static void RemoveEntryByHostName(const std::string& hostName);
+};
+
+// Name resolution as the host's own resolver does it: the hosts file first,
+// then the configured name servers.
+class NameResolverImpl {
+public:
+    // The addresses of `name`; empty when it does not resolve. Throws
+    // HostCtlException only when the resolver cannot be asked at all.
+    std::vector<HostCtl::Network::IpAddress> Resolve(const std::string& name);
 };
 
 class DistributedSwitchInfoImpl {
@@ -207,6 +239,8 @@ public:
     std::vector<std::string> GetKeyboardLayouts();
     // Makes the console use the key mappings of that layout now.
     void LoadKeyboardMappings(const std::string& layout);
+    // The firewall ruleset `id` ("sshServer"); throws when the host has none.
+    HostCtl::Firewall::Ruleset GetFirewallRulesetById(const std::string& id);
 };
 
 }  // namespace System
@@ -219,5 +253,19 @@ public:
 };
 
 }  // namespace Resource
+
+// Services and firewall: command lines run on the host.
+namespace Util {
+
+// Runs `commandLine` through the host's shell; absolute paths in it are host
+// paths. `logOutput`: each line the command prints is written to the system
+// log (informational), otherwise its output is dropped. `wait`: the result is
+// the command's exit status; without it the command is left running in the
+// background and the result is 0 once it has started. `throwOnFailure`: a
+// result other than 0 throws HostCtlException instead of being returned.
+// A shell that cannot be started always throws.
+int QelCtl_Exec(const std::string& commandLine, bool logOutput, bool wait, bool throwOnFailure);
+
+}  // namespace Util
 
 }  // namespace QelCtl

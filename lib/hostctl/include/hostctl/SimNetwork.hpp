@@ -1,12 +1,15 @@
 // The simulated host's network as the host's tools see it: booting the host,
-// and the hosts file that follows the host's name and management address.
+// the hosts file that follows the host's name and management address, and
+// which machines of the network answer the host.
 //
 // The network itself behaves like a host's: every uplink is cabled to one
 // simulated physical network ("network/lan" in the state), whose VLANs may
 // have a DHCP server, an IPv6 router sending router advertisements and a
 // DHCPv6 server. A virtual NIC obtains its dynamic addresses from them when it
 // is configured, renewed, enabled or when the host boots (see SimState.cpp
-// for the fields of the state).
+// for the fields of the state). The machines on each VLAN's segment and those
+// beyond the routers answer pings and DNS queries; nothing is ever sent to a
+// real network.
 #pragma once
 
 #include <nlohmann/json.hpp>
@@ -35,6 +38,26 @@ void BootSimulatedHost(const std::string& root);
 // (just "<address>\t<name>" without a domain), or "" when the management
 // interface has no IPv4 address (or the state does not tell).
 std::string HostsFileEntry(const nlohmann::json& state);
+
+// What answers `target` (an IPv4 or IPv6 address) from the virtual NIC `vnic`
+// in the simulated network of `state`: the machine's entry ("delayMs",
+// "dns", ...), an empty object for one of the interface's own addresses, or
+// null when nothing answers. The rules: the interface has link, and the
+// target is one of its addresses; or a machine of its VLAN's segment
+// ("network/lan/<vlan>/hosts") that an address of the interface reaches
+// (IPv4: the same subnet; IPv6: any address for a link-local target, a global
+// address otherwise); or a machine beyond the routers ("network/remote") when
+// the default gateway of the target's family is reached that way. Throws
+// HostCtlException for an unknown interface, a target that is no address, or
+// a state of the wrong shape.
+nlohmann::json ReachableHost(const SimState& sim, const nlohmann::json& state, const std::string& vnic,
+                             const std::string& target);
+
+// Makes the simulated network's DNS zone ("network/dnsZone") answer the host's
+// fully qualified name with its management IPv4 address, as the network's
+// administrators registered it when the host was installed; without such an
+// address the name is not in the zone.
+void RegisterHostInDnsZone(nlohmann::json& state);
 
 // Rewrites ROOT/etc/hosts (temporary file, flush, rename) so that it holds the
 // host's own line for `state`: lines naming the host by one of its names, now

@@ -49,6 +49,11 @@ public:
     void Update(const std::function<void(nlohmann::json&)>& change,
                 const std::function<void(const nlohmann::json&)>& afterWrite = nullptr);
 
+    // Runs `work` under the lock without reading or writing the state: files
+    // of the host that follow the state (the hosts file) take turns with the
+    // state's writers this way.
+    void WithLock(const std::function<void()>& work);
+
     // Writes `state` as the whole new state, under the lock; the file need not
     // exist yet.
     void Replace(const nlohmann::json& state);

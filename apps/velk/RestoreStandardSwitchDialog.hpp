@@ -1,0 +1,43 @@
+// "Restore Standard Switch": moves the management network off its
+// distributed switch onto a new standard switch: a management port group with
+// the distributed port's VLAN, the distributed switch's uplinks, and the
+// management interface with its IP settings. The host's other interfaces are
+// disabled, as they may depend on the distributed switch.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "SwitchRestoreDialog.hpp"
+#include "hostctl/HostCtl.hpp"
+
+namespace Velk {
+
+class RestoreStandardSwitchDialog : public SwitchRestoreDialog {
+public:
+    explicit RestoreStandardSwitchDialog(Frame* parent);
+
+    // true when the management network was moved.
+    int Run() override;
+
+    // The first of `base` followed by first, first + 1, ... ("kSwitch0") that
+    // `taken` does not hold.
+    static std::string FreeName(const std::vector<std::string>& taken, const std::string& base, int first);
+
+private:
+    void ReadManagementNetwork();
+    void CreateSwitch();
+    void MoveUplinks();
+    void MoveInterface();
+    void DisableOtherInterfaces();
+
+    std::unique_ptr<HostCtl::Network::QelNic> _mgmtIntf;
+    std::string _dvsName;
+    uint16_t _vlanId = 0;
+    std::vector<std::string> _uplinks;
+    std::string _switchName;
+    std::string _portGroup;
+};
+
+}  // namespace Velk

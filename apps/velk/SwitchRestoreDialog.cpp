@@ -1,0 +1,63 @@
+#include "SwitchRestoreDialog.hpp"
+
+#include <syslog.h>
+
+#include "CommandRunner.hpp"
+#include "StringFactory.hpp"
+#include "hostctl/Host.hpp"
+
+namespace Velk {
+
+using HostCtl::Lib::Syslog;
+
+SwitchRestoreDialog::SwitchRestoreDialog(Frame* parent, int height, int headerHeight)
+    : Dialog(parent, 70, height, headerHeight) {
+    _log = new TextArea(_content, 0, 0, _content->GetWidth(), _content->GetHeight(), BLACK);
+}
+
+bool SwitchRestoreDialog::Confirm(const std::string& title, const std::string& header,
+                                  const std::string& question) {
+    SetTitle(title);
+    SetDescription(header);
+    _log->SetText(TextArea::Escape(question) + "\n\n");
+    SetFooter(
+        "{align:right}{color:black}<F11>{/color} {color:dark-grey}OK{/color}  {color:black}<Esc>{/color} "
+        "{color:dark-grey}Cancel{/color}{/align}");
+    Refresh();
+    for (;;) {
+        const int key = GetKey(true);
+        if (key == 27) return false;
+        if (key == KEY_F(11)) break;
+    }
+    SetFooter("");
+    return true;
+}
+
+bool SwitchRestoreDialog::Step(const std::string& text, const std::function<void()>& work) {
+    Syslog(LOG_INFO, "%s", text.c_str());
+    _log->AppendText(TextArea::Escape(text) + " ");
+    Refresh();
+    Window::Flush();
+    try {
+        work();
+    } catch (const HostCtl::Lib::HostCtlException& e) {
+        Syslog(LOG_ERR, "%s failed: %s", text.c_str(), e.what());
+        _log->AppendText(std::string(_factory->GetString(223)) + "\n");
+        Refresh();
+        return false;
+    }
+    _log->AppendText(std::string(_factory->GetString(123)) + "\n");
+    Refresh();
+    return true;
+}
+
+void SwitchRestoreDialog::Finish(const std::string& logLine, const char* event) {
+    Syslog(LOG_INFO, "%s", logLine.c_str());
+    ReportObzEvent("%s", event);
+    SetFooter("{align:right}{color:black}<Enter>{/color}{color:dark-grey} OK{/color}{/align}");
+    Refresh();
+    while (GetKey(true) != '\n') {
+    }
+}
+
+}  // namespace Velk
