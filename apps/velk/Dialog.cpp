@@ -33,6 +33,14 @@ void Dialog::SetTitle(const std::string& text) { _title->SetText(text); }
 void Dialog::SetDescription(const std::string& text) { _description->SetText(text); }
 void Dialog::SetFooter(const std::string& text) { _footer->SetText(text); }
 
+bool Dialog::WaitForF11() {
+    for (;;) {
+        const int key = GetKey(true);
+        if (key == 27) return false;
+        if (key == KEY_F(11)) return true;
+    }
+}
+
 int Dialog::RunForm(const std::function<void()>& draw, const std::function<bool()>& accept,
                     const std::function<void(int)>& onKey) {
     draw();

@@ -38,6 +38,10 @@ protected:
         "{color:dark-grey}Mark Selected{/color}{align:right}{color:black}<Enter>{/color} "
         "{color:dark-grey}OK{/color}  {color:black}<Esc>{/color} {color:dark-grey}Cancel{/color}{/align}";
 
+    // Waits for the key of a destructive action: true for F11, false for Esc;
+    // every other key (Enter included) is ignored.
+    bool WaitForF11();
+
     // The key loop of a form: Esc ends it with false, Enter with true once
     // `accept` agrees (after a refusal `draw` shows the dialog again), and
     // every other key goes to `onKey`. `draw` also draws the dialog first.

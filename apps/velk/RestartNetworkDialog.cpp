@@ -18,13 +18,9 @@ int RestartNetworkDialog::Run() {
         "{align:right}{color:black}<F11>{/color} {color:dark-grey}OK{/color}  {color:black}<Esc>{/color} "
         "{color:dark-grey}Cancel{/color}{/align}");
     Refresh();
-    for (;;) {
-        const int key = GetKey(true);
-        if (key == 27) return false;
-        if (key != KEY_F(11)) continue;
-        DoRestartNetworkDialog(this, *_mgmtIntf).Execute();
-        return true;
-    }
+    if (!WaitForF11()) return false;
+    DoRestartNetworkDialog(this, *_mgmtIntf).Execute();
+    return true;
 }
 
 }  // namespace Velk

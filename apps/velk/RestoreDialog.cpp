@@ -21,11 +21,7 @@ int RestoreDialog::Run() {
     SetFooter(
         "{align:right}{color:black}<F11>{/color} {color:dark-grey}OK{/color}  {color:black}<Esc>{/color} "
         "{color:dark-grey}Cancel{/color}{/align}");
-    for (;;) {
-        const int key = GetKey(true);
-        if (key == 27) return false;
-        if (key == KEY_F(11)) break;
-    }
+    if (!WaitForF11()) return false;
 
     HostCtl::Lib::Syslog(LOG_INFO, "Restoring factory defaults");
     ReportObzEvent("@&!*@*@(obz.user.velk.restore.factory.defaults)Restoring factory defaults");

@@ -22,11 +22,7 @@ int RestoreNetworkDialog::Run() {
         "Reset{/color}{align:right}{color:black}<Esc>{/color} "
         "{color:dark-grey}Cancel{/color}{/align}");
     Refresh();
-    for (;;) {
-        const int key = GetKey(true);
-        if (key == 27) return false;
-        if (key == KEY_F(11)) break;
-    }
+    if (!WaitForF11()) return false;
     DoRestoreNetworkDialog(this).Execute();
     // Written after the work, whatever it came to (also when the warning
     // about running virtual machines was declined).

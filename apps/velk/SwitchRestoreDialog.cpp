@@ -24,11 +24,7 @@ bool SwitchRestoreDialog::Confirm(const std::string& title, const std::string& h
         "{align:right}{color:black}<F11>{/color} {color:dark-grey}OK{/color}  {color:black}<Esc>{/color} "
         "{color:dark-grey}Cancel{/color}{/align}");
     Refresh();
-    for (;;) {
-        const int key = GetKey(true);
-        if (key == 27) return false;
-        if (key == KEY_F(11)) break;
-    }
+    if (!WaitForF11()) return false;
     SetFooter("");
     return true;
 }
