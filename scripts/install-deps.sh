@@ -10,6 +10,8 @@ packages=(
   nlohmann-json3-dev libgtest-dev googletest
   libvterm-dev libpam-wrapper libpam-modules
   openssl openssh-client less
+  scdoc
+  clang-14 libclang-rt-14-dev
 )
 
 missing=()

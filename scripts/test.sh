@@ -13,3 +13,6 @@ BUILD_TYPE=Debug bash scripts/build.sh build-sanitize -DVELK_SANITIZE=ON
 export ASAN_OPTIONS=detect_leaks=1:abort_on_error=1:verify_asan_link_order=0
 export UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1
 (cd build-sanitize && ctest --output-on-failure -j "$(nproc)" --timeout 600)
+
+# Each fuzz target briefly (a clang build of the libraries and fuzz/).
+bash scripts/fuzz.sh 15

@@ -387,7 +387,7 @@ std::string CreateHostRoot(const HostRootOptions& options) {
     WriteFile(root / "var/run/zolva/show-velk-login", "", 0644);
     // The support information pages a host installs with the console.
     fs::create_directories(root / "usr/share/velk");
-    fs::copy_file(VELK_SUPPORT_INFO, root / "usr/share/velk/support-info",
+    fs::copy_file(options.supportInfo, root / "usr/share/velk/support-info",
                   fs::copy_options::overwrite_existing);
 
     WriteFile(root / "bin/hrm-cmd", ToolScript(options.hostCommandBinary, root, "hrm-cmd"), 0755);

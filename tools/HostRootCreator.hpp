@@ -13,6 +13,7 @@ struct HostRootOptions {
     std::string hostname = "host1";
     bool force = false;                      // create over an existing, non-empty folder
     std::string hostCommandBinary;           // absolute path of velk-hostcmd
+    std::string supportInfo;                 // the support information pages to copy into the host
     std::string password;                    // root's console password; empty: a generated "demo-xxxxxx"
     std::vector<std::string> networkShapes;  // see NetworkShapes.hpp
 };

@@ -83,21 +83,44 @@ int Error(const std::string& text) {
     return 1;
 }
 
-// velk-hostcmd sits next to this program in the build tree and where both are
-// installed; the path it was built at is the fallback.
-std::string HostCommandBinary() {
+// The directory of this program, to find what it needs where it is
+// installed: velk-hostcmd in PREFIX/lib/velk-simhost, the support pages in
+// PREFIX/share/velk-simhost (this program being PREFIX/bin/velk-simhost).
+fs::path OwnDirectory() {
     std::error_code ec;
     fs::path self = fs::read_symlink("/proc/self/exe", ec);
-    if (!ec) {
-        fs::path sibling = self.parent_path() / "velk-hostcmd";
-        if (access(sibling.c_str(), X_OK) == 0) return sibling.string();
+    return ec ? fs::path() : self.parent_path();
+}
+
+// velk-hostcmd sits next to this program in the build tree, and in
+// PREFIX/lib/velk-simhost where both are installed; the path it was built at
+// is the fallback.
+std::string HostCommandBinary() {
+    const fs::path own = OwnDirectory();
+    if (!own.empty()) {
+        for (const fs::path& candidate :
+             {own / "velk-hostcmd", own.parent_path() / VELK_SIMHOST_LIBDIR / "velk-hostcmd"}) {
+            if (access(candidate.c_str(), X_OK) == 0) return candidate.string();
+        }
     }
     return VELK_HOSTCMD_BIN;
+}
+
+// The support information pages: installed beside the program, else those of
+// the source tree it was built from.
+std::string SupportInfo() {
+    const fs::path own = OwnDirectory();
+    if (!own.empty()) {
+        const fs::path installed = own.parent_path() / VELK_SIMHOST_DATADIR / "support-info";
+        if (access(installed.c_str(), R_OK) == 0) return installed.string();
+    }
+    return VELK_SUPPORT_INFO;
 }
 
 int Create(const std::vector<std::string>& args) {
     VelkTools::HostRootOptions options;
     options.hostCommandBinary = HostCommandBinary();
+    options.supportInfo = SupportInfo();
     bool haveRoot = false;
     for (size_t i = 0; i < args.size(); ++i) {
         if (args[i] == "--force") {

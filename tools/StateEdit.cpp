@@ -2,6 +2,8 @@
 
 #include <vector>
 
+#include "hostctl/SimState.hpp"
+
 namespace VelkTools {
 
 using nlohmann::json;
@@ -149,9 +151,15 @@ void RemoveAt(json& document, const std::string& pointer) {
 }
 
 json ParseValue(const std::string& text) {
+    // Refused before parsing: copying or writing such a value would overflow
+    // the stack, and no state could hold it anyway.
+    if (HostCtl::Lib::JsonTextDepth(text, HostCtl::Lib::kMaxStateDepth) > HostCtl::Lib::kMaxStateDepth)
+        throw HostCtl::Lib::HostCtlException("the value nests arrays and objects deeper than " +
+                                             std::to_string(HostCtl::Lib::kMaxStateDepth) + " levels");
     try {
         return json::parse(text);
-    } catch (const json::parse_error&) {
+    } catch (const json::exception&) {
+        // Not JSON, or a number no double holds ("1e400"): the text itself.
         return json(text);
     }
 }

@@ -30,6 +30,7 @@ void RemoveAt(nlohmann::json& document, const std::string& pointer);
 
 // `text` parsed as JSON, or `text` itself as a JSON string when it is not JSON
 // ("10.0.0.7" and "Hello" are strings, "42", "true" and "\"x\"" are JSON).
+// JSON nested deeper than a state may be throws HostCtlException.
 nlohmann::json ParseValue(const std::string& text);
 
 }  // namespace VelkTools

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "AdapterInfoDialog.hpp"
+#include "DisplayWidth.hpp"
 #include "MessageDialog.hpp"
 #include "StringFactory.hpp"
 #include "UsedAdaptersDialog.hpp"
@@ -47,12 +48,16 @@ AdaptersDialog::~AdaptersDialog() {
 }
 
 std::string AdaptersDialog::RowText(const Adapter& adapter, const std::string& switchName) {
-    const std::string name = adapter.name.size() < 12 ? adapter.name : adapter.name.substr(0, 8) + "...";
+    // Lengths are screen columns: a label may hold wide characters, and a
+    // cut never splits a character.
+    const std::string name =
+        DisplayColumns(adapter.name) < 12 ? adapter.name : CutToColumns(adapter.name, 8) + "...";
     const std::string label =
-        adapter.label.size() <= 14 ? adapter.label : adapter.label.substr(0, 11) + "...";
+        DisplayColumns(adapter.label) <= 14 ? adapter.label : CutToColumns(adapter.label, 11) + "...";
     std::string mac = adapter.mac;
-    if (label.size() + mac.size() >= 26) {
-        const size_t keep = std::min(mac.size(), 22 - label.size());
+    const int labelColumns = DisplayColumns(label);
+    if (labelColumns + DisplayColumns(mac) >= 26) {
+        const size_t keep = std::min(mac.size(), size_t(22 - labelColumns));
         mac = "..." + mac.substr(mac.size() - keep);
     }
     return "{align:padding:13}" + TextArea::Escape(name) + "{/align}{align:padding:30}" +

@@ -1,6 +1,7 @@
 #include "CommandRunner.hpp"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <signal.h>
 #include <sys/wait.h>
 #include <syslog.h>
@@ -24,20 +25,95 @@ using HostCtl::Lib::Syslog;
 namespace {
 
 constexpr useconds_t kPollMicros = 20000;
+constexpr int kPollMillis = 20;
 
 void ClosePair(int fds[2]) {
     close(fds[0]);
     close(fds[1]);
 }
 
-// One read of at most *len bytes; the length becomes what was read (0 on error).
-void ReadOnce(int fd, char* buf, size_t* len) {
-    if (!buf || !len) return;
-    ssize_t n;
-    do {
-        n = read(fd, buf, *len);
-    } while (n < 0 && errno == EINTR);
-    *len = n < 0 ? 0 : static_cast<size_t>(n);
+// What the console keeps of one output stream of a child: the first bytes,
+// up to the caller's buffer; the rest is read and dropped, so a child that
+// writes more than a pipe holds never blocks.
+struct Capture {
+    int fd;
+    char* buf;
+    size_t capacity;
+    size_t kept = 0;
+    bool open = true;
+
+    void Drain() {
+        char scratch[4096];
+        for (;;) {
+            char* into = scratch;
+            size_t room = sizeof scratch;
+            if (buf && kept < capacity) {
+                into = buf + kept;
+                room = capacity - kept;
+            }
+            const ssize_t n = read(fd, into, room);
+            if (n > 0) {
+                if (into != scratch) kept += static_cast<size_t>(n);
+                continue;
+            }
+            if (n < 0 && errno == EINTR) continue;
+            if (n == 0) open = false;
+            return;  // EAGAIN: nothing more for now
+        }
+    }
+};
+
+// Waits for the child while reading its output. With a time limit the child
+// is killed when it runs out. A termination signal ends the console from
+// here (the signal thread has already asked the child to end). False when
+// the child could not be waited for.
+bool WaitForChild(pid_t pid, int timeoutSeconds, int outFd, char* outBuf, size_t* outLen, int errFd,
+                  char* errBuf, size_t* errLen, int* status, bool* killed) {
+    Capture out{outFd, outBuf, outBuf && outLen ? *outLen : 0};
+    Capture err{errFd, errBuf, errBuf && errLen ? *errLen : 0};
+    fcntl(outFd, F_SETFL, O_NONBLOCK);
+    fcntl(errFd, F_SETFL, O_NONBLOCK);
+    Frame::SetForegroundChild(pid);
+    long long budget = static_cast<long long>(timeoutSeconds) * 1000;
+    bool ok = true;
+    for (;;) {
+        const pid_t r = waitpid(pid, status, WNOHANG);
+        if (r == pid) break;
+        if (r < 0 && errno != EINTR) {
+            ok = false;
+            break;
+        }
+        if (Frame::EndRequested()) {
+            // Give the child a moment to end on the signal thread's SIGTERM.
+            for (int i = 0; i < 50 && waitpid(pid, status, WNOHANG) == 0; ++i) usleep(kPollMicros);
+            kill(pid, SIGKILL);
+            waitpid(pid, status, 0);
+            Frame::SetForegroundChild(0);
+            Frame::EndIfRequested();
+        }
+        struct pollfd fds[2] = {{out.open ? outFd : -1, POLLIN, 0}, {err.open ? errFd : -1, POLLIN, 0}};
+        const int n = poll(fds, 2, kPollMillis);
+        if (n > 0) {
+            if (fds[0].revents) out.Drain();
+            if (fds[1].revents) err.Drain();
+        }
+        if (timeoutSeconds > 0 && (budget -= kPollMillis) < 1) {
+            Syslog(LOG_WARNING, "Killing process because %d seconds timeout expired", timeoutSeconds);
+            kill(pid, SIGKILL);
+            // Reap it so no zombie stays behind; the result is -1.
+            while (waitpid(pid, status, 0) < 0 && errno == EINTR) {
+            }
+            *killed = true;
+            break;
+        }
+    }
+    Frame::SetForegroundChild(0);
+    // What the child wrote just before it ended is still in the pipes.
+    if (out.open) out.Drain();
+    if (err.open) err.Drain();
+    if (outLen) *outLen = outBuf ? out.kept : 0;
+    if (errLen) *errLen = errBuf ? err.kept : 0;
+    return ok;
 }
 
 }  // namespace
@@ -90,6 +166,13 @@ int Spawn(const char* path, const char* const argv[], const char* const env[], c
         return -1;
     }
     const std::string program = HostCtl::Lib::HostPath(path);
+    // No new child once the console is ending.
+    if (Frame::EndRequested()) {
+        ClosePair(errPipe);
+        ClosePair(outPipe);
+        ClosePair(inPipe);
+        Frame::EndIfRequested();
+    }
 
     // The screen shows what the console waits for while the child runs.
     Window::Flush();
@@ -134,37 +217,11 @@ int Spawn(const char* path, const char* const argv[], const char* const env[], c
 
     int status = 0;
     bool killed = false;
-    if (timeoutSeconds > 0) {
-        long long budget = static_cast<long long>(timeoutSeconds) * 1000000;
-        for (;;) {
-            pid_t r = waitpid(pid, &status, WNOHANG);
-            if (r == pid) break;
-            if (r < 0 && errno != EINTR) break;
-            usleep(kPollMicros);
-            budget -= kPollMicros;
-            if (budget < 1) {
-                Syslog(LOG_WARNING, "Killing process because %d seconds timeout expired", timeoutSeconds);
-                kill(pid, SIGKILL);
-                // Reap it so no zombie stays behind; the result is -1 below.
-                while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
-                }
-                killed = true;
-                break;
-            }
-        }
-    } else {
-        while (waitpid(pid, &status, 0) < 0) {
-            if (errno != EINTR) {
-                status = -1;
-                break;
-            }
-        }
-    }
-
-    ReadOnce(outPipe[0], outBuf, outLen);
-    ReadOnce(errPipe[0], errBuf, errLen);
+    const bool waited = WaitForChild(pid, timeoutSeconds, outPipe[0], outBuf, outLen, errPipe[0], errBuf,
+                                     errLen, &status, &killed);
     close(outPipe[0]);
     close(errPipe[0]);
+    if (!waited) status = -1;
 
     if (!killed && status != -1 && WIFEXITED(status)) return WEXITSTATUS(status);
     Syslog(LOG_ERR, "Run Command did not terminate normally");

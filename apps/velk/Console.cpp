@@ -10,6 +10,8 @@
 #include <cerrno>
 
 #include "hostctl/Host.hpp"
+// Defines macros such as "lines" and "columns": last.
+#include <term.h>
 
 bool runningOverSerial = true;
 bool bwColor = false;
@@ -154,6 +156,28 @@ void LogError(const char* what) {
     char buf[256];
     const char* text = strerror_r(err, buf, sizeof buf);
     HostCtl::Lib::Syslog(LOG_ERR, "%s with errno(%d): %s", what, err, text);
+}
+
+std::string TerminalProblem() {
+    if (!isatty(0) || !isatty(1)) return "standard input and output must be a terminal";
+    const char* term = getenv("TERM");
+    if (!term || !*term) return "TERM is not set";
+    int error = 0;
+    if (setupterm(term, 1, &error) != OK) return std::string("unknown terminal type \"") + term + "\"";
+    const char* address = tigetstr("cup");
+    const bool addressable = address != nullptr && address != reinterpret_cast<char*>(-1);
+    del_curterm(cur_term);
+    if (!addressable) return std::string("terminal type \"") + term + "\" cannot place the cursor";
+    return "";
+}
+
+void DisableFlowControl() {
+    struct termios modes;
+    if (tcgetattr(0, &modes) != 0) return;
+    modes.c_iflag &= ~static_cast<tcflag_t>(IXON | IXOFF);
+    tcsetattr(0, TCSANOW, &modes);
+    // Curses restores these modes after a child had the terminal.
+    def_prog_mode();
 }
 
 }  // namespace Velk

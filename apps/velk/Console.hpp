@@ -36,4 +36,16 @@ void SwitchToVt(int vt);
 // Logs "<what> with errno(N): <text>" at LOG_ERR.
 void LogError(const char* what);
 
+// Why the console cannot run on this terminal, or "" when it can: standard
+// input or output is not a terminal, TERM is unset or unknown, or the
+// terminal type cannot place the cursor (such as "dumb").
+std::string TerminalProblem();
+// Ctrl-S and Ctrl-Q are ordinary (ignored) keys: a stray Ctrl-S must never
+// freeze the console, and its output is small enough not to need pacing.
+void DisableFlowControl();
+
+// The smallest terminal on which every screen and dialog fits.
+inline constexpr int kMinColumns = 78;
+inline constexpr int kMinLines = 23;
+
 }  // namespace Velk

@@ -51,6 +51,7 @@ HostCtl::Network::IpConfig DoRestartNetworkDialog::WaitForLease(HostCtl::Network
     Progress(_factory->GetString(264));
     for (int waited = 0; waited < kDhcpWaitSeconds * 2 && config.GetIpv4Address().IsZero(); ++waited) {
         usleep(kDhcpPollMicros);
+        EndIfRequested();
         config = _mgmtIntf.GetIpConfig();
     }
     Progress(Done(_factory->GetString(config.GetIpv4Address().IsZero() ? 223 : 123)));

@@ -1,11 +1,13 @@
 #include "Frame.hpp"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <pthread.h>
 #include <sys/ioctl.h>
 #include <sys/select.h>
 #include <sys/wait.h>
 #include <syslog.h>
+#include <termios.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -36,6 +38,33 @@ std::function<void(pid_t, int)> Frame::_childExitHandler;
 
 namespace {
 constexpr long kDimSeconds = 60;
+// Reads that find the terminal readable but yield no key, in a row, after
+// which its input counts as ended (a tty gives at least one byte per wake-up).
+constexpr int kEmptyReadsAtEnd = 3;
+// How long the main thread has to end after a termination signal before the
+// signal side ends the process itself (it is stuck somewhere).
+constexpr unsigned kEmergencyExitSeconds = 5;
+
+std::atomic<int> endRequest{0};  // 0 or the event that ends the console
+std::atomic<pid_t> foregroundChild{0};
+std::atomic<bool> loggedInShadow{false};  // _loggedIn, readable by the signal thread
+std::atomic<bool> emergencyArmed{false};
+int emptyReads = 0;
+
+// Last resort when the main thread does not end after a termination signal:
+// the terminal gets its modes back, the foreground child is killed, and the
+// process ends at once. Only async-signal-safe calls.
+void* EmergencyExit(void*) {
+    unsigned left = kEmergencyExitSeconds;
+    while (left > 0) left = sleep(left);
+    const pid_t child = foregroundChild.load();
+    if (child > 0) kill(child, SIGKILL);
+    tcsetattr(1, TCSANOW, &orig_termios);
+    static const char kReset[] = "\x1b[0m\x1b[H\x1b[2J\x1b[?25h";
+    ssize_t ignored = write(1, kReset, sizeof kReset - 1);
+    (void)ignored;
+    _exit(0);
+}
 
 struct WatchedChild {
     pid_t pid;
@@ -183,7 +212,17 @@ int Frame::WaitForInput(struct timeval* timeout) {
         wtimeout(stdscr, 0);
         int key = wgetch(stdscr);
         wtimeout(stdscr, -1);
-        return key;
+        if (key != ERR) {
+            emptyReads = 0;
+            return key;
+        }
+        // A closed or hung-up terminal stays readable for ever: end like a
+        // hang-up instead of spinning on it.
+        if (EndOfInput()) {
+            Syslog(LOG_WARNING, "End of input on the terminal, exiting");
+            exit(0);
+        }
+        return EV_ERROR;
     }
     if (FD_ISSET(_signalPipe[0], &fds)) {
         unsigned char byte = 0;
@@ -229,9 +268,13 @@ void* Frame::SignalHandler(void*) {
                 break;
             case SIGUSR2:
                 byte = 2;
+                // Logged in, the restart waits for the log-out; otherwise it
+                // ends the console like a termination.
+                if (!loggedInShadow.load()) RequestEnd(EV_RESTART);
                 break;
             case SIGWINCH:
                 byte = 3;
+                RequestEnd(EV_RESIZE);
                 break;
             case SIGCHLD:
                 byte = 5;
@@ -240,6 +283,7 @@ void* Frame::SignalHandler(void*) {
             case SIGQUIT:
             case SIGTERM:
                 byte = 4;
+                RequestEnd(EV_TERMINATE);
                 break;
             default:
                 continue;
@@ -250,6 +294,89 @@ void* Frame::SignalHandler(void*) {
         } while (w <= 0 && errno == EINTR);
     }
     return nullptr;
+}
+
+void Frame::RequestEnd(int event) {
+    int none = 0;
+    endRequest.compare_exchange_strong(none, event);
+    // The child the main thread waits for is asked to end, so the wait ends.
+    const pid_t child = foregroundChild.load();
+    if (child > 0) kill(child, SIGTERM);
+    // Output held back by a stop character (Ctrl-S) would keep the main
+    // thread in a write for ever.
+    tcflow(1, TCOON);
+    if (!emergencyArmed.exchange(true)) {
+        pthread_t thread;
+        if (pthread_create(&thread, nullptr, EmergencyExit, nullptr) == 0) pthread_detach(thread);
+    }
+}
+
+bool Frame::EndOfInput() {
+    struct pollfd input = {0, POLLIN, 0};
+    if (poll(&input, 1, 0) < 0) return false;
+    if (input.revents & (POLLHUP | POLLERR | POLLNVAL)) return true;
+    if (!(input.revents & POLLIN)) {
+        emptyReads = 0;
+        return false;
+    }
+    return ++emptyReads >= kEmptyReadsAtEnd;
+}
+
+void Frame::SetForegroundChild(pid_t pid) {
+    foregroundChild.store(pid);
+    // A signal that came before the child was registered asks it here.
+    if (pid > 0 && endRequest.load() != 0) kill(pid, SIGTERM);
+}
+
+bool Frame::EndRequested() { return endRequest.load() != 0; }
+
+void Frame::EndIfRequested() {
+    const int event = endRequest.load();
+    if (event == 0) return;
+    if (event == EV_RESIZE) ResizeTerminal();
+    exit(0);
+}
+
+void Frame::RefuseSmallTerminal() {
+    Syslog(LOG_WARNING, "Terminal too small: %dx%d, the console needs at least %dx%d", COLS, LINES,
+           kMinColumns, kMinLines);
+    const std::string notice = "Terminal too small: " + std::to_string(COLS) + "x" + std::to_string(LINES) +
+                               ". This console needs at least " + std::to_string(kMinColumns) +
+                               " columns and " + std::to_string(kMinLines) + " lines.";
+    // Word-wrapped to the width; a word longer than a row is cut.
+    std::vector<std::string> rows;
+    std::string row;
+    size_t at = 0;
+    while (at < notice.size()) {
+        size_t end = notice.find(' ', at);
+        if (end == std::string::npos) end = notice.size();
+        const std::string word = notice.substr(at, end - at);
+        at = end + 1;
+        if (!row.empty() && static_cast<int>(row.size() + 1 + word.size()) > COLS) {
+            rows.push_back(row);
+            row.clear();
+        }
+        row += (row.empty() ? "" : " ") + word;
+    }
+    if (!row.empty()) rows.push_back(row);
+    erase();
+    const int top = std::max(0, (LINES - static_cast<int>(rows.size())) / 2);
+    for (size_t i = 0; i < rows.size() && top + static_cast<int>(i) < LINES; ++i)
+        mvaddnstr(top + static_cast<int>(i), 0, rows[i].c_str(), COLS);
+    refresh();
+    for (;;) {
+        switch (WaitForInput(nullptr)) {
+            case EV_TERMINATE:
+            case EV_RESTART:
+                exit(0);
+            case EV_RESIZE:
+            case KEY_RESIZE:
+                ResizeTerminal();
+                exit(0);
+            default:
+                break;  // keys and refreshes change nothing here
+        }
+    }
 }
 
 void Frame::WatchChild(pid_t pid, bool killAtExit) {
@@ -301,6 +428,7 @@ void Frame::LoadIdleTimeout() {
 
 void Frame::SetLoggedIn(bool loggedIn) {
     _loggedIn = loggedIn;
+    loggedInShadow.store(loggedIn);
     if (loggedIn) LoadIdleTimeout();
 }
 

@@ -6,6 +6,7 @@
 #include <signal.h>
 #include <sys/time.h>
 
+#include <atomic>
 #include <functional>
 #include <string>
 
@@ -52,6 +53,22 @@ public:
     // screen waiting for a child can look again.
     static std::function<void(pid_t, int)> _childExitHandler;
 
+    // A termination signal (or a resize) while the console waits for a child
+    // must still end it promptly. The child the console waits for in the
+    // foreground (a host tool, the pager) is registered here: the signal
+    // thread asks it to end, and the waiting code calls EndIfRequested once
+    // it is gone. Pass 0 when the wait is over.
+    static void SetForegroundChild(pid_t pid);
+    static bool EndRequested();
+    // Ends the console (status 0) if a termination or resize arrived; the
+    // resize is logged first, as in GetKey.
+    static void EndIfRequested();
+
+    // Says that the terminal is smaller than the screens need, then only
+    // answers signals: no screen is drawn and no key is taken. A resize ends
+    // the console, whose supervisor starts it again at the new size.
+    [[noreturn]] static void RefuseSmallTerminal();
+
     // Event codes of WaitForInput.
     enum Event {
         EV_ERROR = -1,
@@ -73,6 +90,11 @@ public:
     static bool _loggedIn;
     static bool _markForRestart;
     static unsigned int _idleTimeout;
+
+private:
+    static void RequestEnd(int event);
+    static void ArmEmergencyExit();
+    static bool EndOfInput();
 
 protected:
     Frame* _parent;

@@ -1,7 +1,9 @@
 #include "InputItem.hpp"
 
 #include <curses.h>
+#include <string.h>
 
+#include <algorithm>
 #include <cctype>
 
 #include "Pam.hpp"
@@ -11,6 +13,8 @@ namespace Velk {
 
 namespace {
 constexpr int kBackspaceByte = 8;
+// Room a masked field keeps for its text, so typing a secret rarely moves it.
+constexpr size_t kSecretRoom = 128;
 }  // namespace
 
 InputItem::InputItem(const std::string& label, const std::string& initialText, int fieldWidth)
@@ -20,7 +24,11 @@ InputItem::InputItem(const std::string& label, const std::string& initialText, i
       _fieldWidth(fieldWidth),
       _position(static_cast<int>(initialText.size())) {}
 
-InputItem::~InputItem() = default;
+// A masked field closed without its secret being used (Esc) still leaves no
+// copy behind.
+InputItem::~InputItem() {
+    if (_masked) WipeSecret(_text);
+}
 
 void InputItem::Changed() {
     // Entering the field selects its value again, as a prefilled value is at
@@ -32,7 +40,29 @@ void InputItem::Changed() {
     }
 }
 
+void InputItem::SetMasked(bool masked) {
+    _masked = masked;
+    ReserveSecretRoom(kSecretRoom);
+}
+
+// A masked text grows only through here: the new buffer is filled, the old
+// one wiped before it is freed, so no copy of a secret stays in freed memory.
+// Reserving up front also keeps a secret out of the string's inline buffer,
+// whose tail would survive a move to the heap.
+void InputItem::ReserveSecretRoom(size_t needed) {
+    if (!_masked || _text.capacity() >= needed) return;
+    std::string bigger;
+    bigger.reserve(std::max({needed, 2 * _text.capacity(), kSecretRoom}));
+    bigger.assign(_text);
+    explicit_bzero(_text.data(), _text.capacity());
+    _text.swap(bigger);
+}
+
 void InputItem::SetText(const std::string& text) {
+    if (_masked) {
+        WipeSecret(_text);
+        ReserveSecretRoom(text.size() + 1);
+    }
     _text = text;
     _fresh = true;
     _offset = 0;
@@ -41,12 +71,14 @@ void InputItem::SetText(const std::string& text) {
 
 void InputItem::WipeText() {
     WipeSecret(_text);
+    ReserveSecretRoom(kSecretRoom);
     _position = 0;
     _offset = 0;
     _fresh = true;
 }
 
 void InputItem::Clear() {
+    if (_masked) explicit_bzero(_text.data(), _text.capacity());
     _text.clear();
     _position = 0;
     _offset = 0;
@@ -103,6 +135,7 @@ bool InputItem::HandleKey(int key) {
     if (key < 0 || key > 255 || !std::isprint(key)) return false;
     if (_fresh) Clear();
     if (_maxLength >= 0 && Length() >= _maxLength) return true;
+    ReserveSecretRoom(_text.size() + 1);
     _text.insert(static_cast<size_t>(_position), 1, static_cast<char>(key));
     ++_position;
     return true;
@@ -130,11 +163,14 @@ void InputItem::Draw(TextArea* area) {
     if (width > Length()) _offset = 0;
     if (_position - _offset > width) _offset = _position - width;
 
-    std::string shown = _offset < Length()
-                            ? _text.substr(static_cast<size_t>(_offset), static_cast<size_t>(width))
-                            : std::string();
-    const size_t shownLength = shown.size();
-    shown = _masked ? std::string(shownLength, '*') : TextArea::Escape(shown);
+    // A masked text is never copied, not even in part: only its length is.
+    const size_t shownLength = _offset < Length() ? std::min<size_t>(static_cast<size_t>(Length() - _offset),
+                                                                     static_cast<size_t>(width))
+                                                  : 0;
+    std::string shown = _masked ? std::string(shownLength, '*')
+                        : shownLength == 0
+                            ? std::string()
+                            : TextArea::Escape(_text.substr(static_cast<size_t>(_offset), shownLength));
 
     // The field ends one column before the row's end, so that the cursor
     // after its last character stays inside the row.

@@ -46,7 +46,7 @@ public:
     void WipeText();
     const std::string& GetLabel() const { return _label; }
     // Masked fields (passwords) show one "*" per character.
-    void SetMasked(bool masked) { _masked = masked; }
+    void SetMasked(bool masked);
     bool IsMasked() const { return _masked; }
 
     int GetPosition() const { return _position; }
@@ -58,6 +58,7 @@ public:
 
 private:
     void Clear();
+    void ReserveSecretRoom(size_t needed);
     int Length() const { return static_cast<int>(_text.size()); }
 
     std::string _label;

@@ -1,5 +1,6 @@
 #include "LogViewer.hpp"
 
+#include <signal.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -79,16 +80,27 @@ void LogViewer::ViewLog(int row, Frame* owner) {
 
     const pid_t pid = fork();
     if (pid == 0) {
+        // The pager starts with the signals the console blocks open again
+        // (it must end on SIGTERM and follow SIGWINCH), the default SIGPIPE,
+        // and none of the console's descriptors but the terminal.
+        sigset_t none;
+        sigemptyset(&none);
+        sigprocmask(SIG_SETMASK, &none, nullptr);
+        signal(SIGPIPE, SIG_DFL);
+        closefrom(3);
         execve(pager.c_str(), const_cast<char* const*>(argv), const_cast<char* const*>(env.data()));
         _exit(0);
     }
     if (pid > 0) {
-        // Only the pager's own end counts; interrupted waits are repeated.
+        // A termination signal ends the pager (through the signal thread),
+        // then the console below. Only the pager's own end counts.
+        Frame::SetForegroundChild(pid);
         for (;;) {
             const pid_t done = waitpid(pid, nullptr, 0);
             if (done == pid) break;
             if (done == -1 && errno != EINTR) break;
         }
+        Frame::SetForegroundChild(0);
     }
 
     if (haveSaved) tcsetattr(1, TCSANOW, &saved);
@@ -100,6 +112,7 @@ void LogViewer::ViewLog(int row, Frame* owner) {
     Frame::fgFrame = owner;
     clearok(curscr, TRUE);
     owner->Refresh();
+    Frame::EndIfRequested();
 }
 
 }  // namespace Velk

@@ -79,7 +79,8 @@ int PamChangePassword(const std::string& user, const std::string& oldSecret, con
 }
 
 void WipeSecret(std::string& secret) {
-    if (!secret.empty()) explicit_bzero(secret.data(), secret.size());
+    // The whole buffer: bytes past the end may hold an earlier, longer text.
+    explicit_bzero(secret.data(), secret.capacity());
     secret.clear();
     secret.shrink_to_fit();
 }

@@ -1,6 +1,5 @@
 #include "RestoreDialog.hpp"
 
-#include <sched.h>
 #include <syslog.h>
 
 #include "CommandRunner.hpp"
@@ -37,8 +36,9 @@ int RestoreDialog::Run() {
     while (GetKey(false) != '\n') {
     }
     if (RunShellCommand("reboot -f") == -1) return false;
-    // The host is going down: spin without reading keys until it is gone.
-    for (;;) sched_yield();
+    // The host is going down: nothing is left to do but answer signals until
+    // it is gone; keys are read and dropped.
+    for (;;) GetKey(false);
 }
 
 }  // namespace Velk

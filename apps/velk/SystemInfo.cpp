@@ -57,7 +57,9 @@ std::string FieldText(const char* record, size_t offset, size_t width) {
 
 std::string FormatMemorySize(uint64_t bytes) {
     static const char kUnits[] = {'M', 'G', 'T', 'P', 'E'};
-    const uint64_t value = (bytes + 268435455ULL) & ~268435455ULL;
+    constexpr uint64_t kStep = 268435455ULL;  // rounding up to 256 MiB
+    // Sizes too large to round up stay at the largest step below them.
+    const uint64_t value = bytes > UINT64_MAX - kStep ? UINT64_MAX & ~kStep : (bytes + kStep) & ~kStep;
     uint64_t unit = 1048576;
     int index = 0;
     while (index < 4 && value / 1024 >= unit) {
@@ -82,7 +84,10 @@ std::string FormatVersion(const std::string& version, uint32_t build) {
 
 uint64_t GetTotalMemoryBytes() {
     QelCtl::Hardware::MemoryInfoImpl memory;
-    return memory.GetTotalPages() * memory.GetPageSize();
+    uint64_t bytes = 0;
+    // A product past 64 bits is shown as the largest size, never wrapped.
+    if (__builtin_mul_overflow(memory.GetTotalPages(), memory.GetPageSize(), &bytes)) return UINT64_MAX;
+    return bytes;
 }
 
 std::string GetSshKeyFingerprint(const std::string& keyFile) {

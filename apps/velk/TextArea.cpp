@@ -3,6 +3,7 @@
 #include <string_view>
 
 #include "Console.hpp"
+#include "DisplayWidth.hpp"
 
 namespace Velk {
 
@@ -11,25 +12,6 @@ namespace {
 constexpr size_t kNone = std::string::npos;
 // How a literal "{" travels through the laid-out text.
 constexpr std::string_view kLbraceTag = "{lbrace}";
-
-bool IsContinuationByte(char c) { return (static_cast<unsigned char>(c) & 0xC0) == 0x80; }
-
-// Bytes of the UTF-8 character that starts at text[i]. A malformed or cut
-// sequence counts as a character of the bytes that do continue it.
-size_t CharLength(std::string_view text, size_t i) {
-    const unsigned char lead = static_cast<unsigned char>(text[i]);
-    size_t expected = 1;
-    if ((lead & 0xE0) == 0xC0) {
-        expected = 2;
-    } else if ((lead & 0xF0) == 0xE0) {
-        expected = 3;
-    } else if ((lead & 0xF8) == 0xF0) {
-        expected = 4;
-    }
-    size_t length = 1;
-    while (length < expected && i + length < text.size() && IsContinuationByte(text[i + length])) ++length;
-    return length;
-}
 
 bool StartsWith(std::string_view text, std::string_view prefix) {
     return text.substr(0, prefix.size()) == prefix;
@@ -50,8 +32,10 @@ bool ParseCount(std::string_view digits, int& count) {
     return true;
 }
 
-// One layout pass over a mark-up text. Columns are counted per character;
-// positions are byte offsets into the output.
+// One layout pass over a mark-up text. Columns are screen columns (a wide
+// character takes two, a combining one none); positions are byte offsets into
+// the output. The text it shows is valid UTF-8: bytes that are not, and
+// characters a terminal cannot show, come out as U+FFFD.
 class Layouter {
 public:
     explicit Layouter(int width) : _width(width), _left(width) {}
@@ -67,9 +51,9 @@ public:
                 i = close + 1;
                 continue;
             }
-            const size_t length = CharLength(text, i);
-            Plain(text.substr(i, length), false);
-            i += length;
+            const Glyph glyph = NextGlyph(text, i);
+            Plain(glyph, false);
+            i += glyph.length;
         }
     }
 
@@ -82,8 +66,9 @@ private:
         if (tag.empty()) return;
         if (IsColorTag(tag)) {
             _out += '{' + tag + '}';
+            _afterBase = false;
         } else if (tag == "lbrace") {
-            Char("{", false);
+            Char("{", 1, false);
         } else if (tag == "/align") {
             EndAlign();
         } else if (StartsWith(tag, "align:")) {
@@ -92,9 +77,9 @@ private:
             std::string value;
             if (lookup && lookup(tag, value)) {
                 for (size_t i = 0; i < value.size();) {
-                    const size_t length = CharLength(value, i);
-                    Plain(std::string_view(value).substr(i, length), true);
-                    i += length;
+                    const Glyph glyph = NextGlyph(value, i);
+                    Plain(glyph, true);
+                    i += glyph.length;
                 }
             }
         }
@@ -103,6 +88,7 @@ private:
 
     void StartAlign(std::string_view how) {
         _alignStart = _out.size();
+        _fieldFull = false;
         if (how == "right") {
             _mode = Align::Right;
         } else if (how == "center") {
@@ -150,36 +136,66 @@ private:
     }
 
     // A character of the text (fromValue false) or of a host value.
-    void Plain(std::string_view ch, bool fromValue) {
-        const char c = ch[0];
+    void Plain(const Glyph& glyph, bool fromValue) {
+        const char c = glyph.shown[0];
         if (c == '\n') {
             _out += '\n';
             LineStarted(_out.size() - 1);
             _left = _width;
+            _afterBase = false;
             return;
         }
         if (c == '\t') {
-            Char(" ", fromValue);
-        } else if (static_cast<unsigned char>(c) >= 0x20 && c != 0x7f) {
-            Char(ch, fromValue);
+            Char(" ", 1, fromValue);
+        } else if (glyph.replaced || (static_cast<unsigned char>(c) >= 0x20 && c != 0x7f)) {
+            Char(glyph.shown, glyph.columns, fromValue);
         }
         // Other control characters would upset the terminal: dropped.
     }
 
-    void Char(std::string_view ch, bool fromValue) {
-        if (_mode == Align::Padding && _allowance <= 0) return;
+    void Char(std::string_view ch, int columns, bool fromValue) {
+        // A character wider than the whole area could never be shown.
+        if (columns > _width) {
+            ch = kReplacementChar;
+            columns = 1;
+        }
+        // A combining character is shown in the cell of the character right
+        // before it. Without one (at the start of a line, after a colour tag
+        // or a character cut off) it is dropped: the terminal would have no
+        // cell to put it in.
+        if (columns == 0) {
+            // A cell holds a few combining characters at most.
+            if (_afterBase && _marks < CCHARW_MAX - 1) {
+                // A blank with a mark on it is no longer a place to break.
+                if (_lastBlank != kNone && _lastBlank + 1 == _out.size()) _lastBlank = kNone;
+                _out += ch;
+                ++_marks;
+            }
+            return;
+        }
+        if (_mode == Align::Padding && (_fieldFull || _allowance < columns)) {
+            // The field is full: the rest of its text is cut off, from a wide
+            // character that would have fitted only half on; the columns
+            // left are filled with blanks at its end.
+            _fieldFull = true;
+            _afterBase = false;
+            return;
+        }
+        _afterBase = true;
+        _marks = 0;
         const bool blank = ch == " ";
-        if (_left <= 0) {
+        if (_left < columns) {
             if (blank && !fromValue) {
                 // A blank that meets a full line becomes the line break itself,
                 // so the next line does not start with it.
                 _out += '\n';
                 LineStarted(_out.size() - 1);
                 _left = _width;
+                _afterBase = false;
                 if (_mode == Align::Padding) --_allowance;
                 return;
             }
-            if (!fromValue && _lastBlank != kNone) {
+            if (!fromValue && _lastBlank != kNone && _width - _sinceBlank >= columns) {
                 _out[_lastBlank] = '\n';
                 LineStarted(_lastBlank);
                 _left = _width - _sinceBlank;
@@ -196,13 +212,13 @@ private:
         } else {
             _out += ch;
         }
-        --_left;
-        if (_mode == Align::Padding) --_allowance;
+        _left -= columns;
+        if (_mode == Align::Padding) _allowance -= columns;
         if (blank && !fromValue) {
             _lastBlank = _out.size() - 1;
             _sinceBlank = 0;
         } else {
-            ++_sinceBlank;
+            _sinceBlank += columns;
         }
     }
 
@@ -220,7 +236,10 @@ private:
     int _sinceBlank = 0;        // columns written since that blank
     size_t _alignStart = 0;
     Align _mode = Align::None;
-    int _allowance = 0;  // padding: columns the aligned text may still take
+    int _allowance = 0;       // padding: columns the aligned text may still take
+    bool _fieldFull = false;  // padding: the aligned text was cut off
+    bool _afterBase = false;  // the output ends in a shown character
+    int _marks = 0;           // combining characters after it
 };
 
 }  // namespace
@@ -286,13 +305,7 @@ std::string TextArea::Escape(const std::string& plain) {
     return out;
 }
 
-int TextArea::Columns(const std::string& plain) {
-    int columns = 0;
-    for (char c : plain) {
-        if (!IsContinuationByte(c)) ++columns;
-    }
-    return columns;
-}
+int TextArea::Columns(const std::string& plain) { return DisplayColumns(plain); }
 
 void TextArea::Draw() {
     WINDOW* win = GetWindow();
@@ -315,7 +328,7 @@ void TextArea::Draw() {
         if (run.empty()) return;
         const attr_t attr = visible ? ColorAttr(bg, fg) : ColorAttr(BLACK, DARK_GREY);
         wattrset(win, static_cast<int>(attr));
-        if (wmove(win, line, column) != ERR) waddnstr(win, run.c_str(), -1);
+        if (wmove(win, line, column) != ERR) AddShownText(win, run);
         column += Columns(run);
         run.clear();
     };

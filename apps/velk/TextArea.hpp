@@ -26,7 +26,9 @@ public:
     // Hidden areas redraw their text dimmed, visible ones in its colours.
     void Show(bool visible) override;
 
-    // Lays out mark-up to a width: returns the text with line breaks inserted,
+    // Lays out mark-up to a width in screen columns (DisplayWidth.hpp: wide
+    // characters take two, combining ones none, invalid UTF-8 comes out as
+    // U+FFFD): returns the text with line breaks inserted,
     // alignment blanks added, value keys expanded and colour tags kept.
     // lookup answers a value key with its text, or false when the key is
     // unknown. Pure: no curses, no host. A literal "{" (from a value, or
@@ -38,7 +40,8 @@ public:
     // Mark-up that shows `plain` as it stands (user input: "{" is escaped).
     static std::string Escape(const std::string& plain);
 
-    // Screen columns of UTF-8 text without mark-up: one per character.
+    // Screen columns of UTF-8 text without mark-up: two for a wide
+    // character, none for a combining one, one for an invalid byte.
     static int Columns(const std::string& plain);
 
     // Host values reachable through value keys ("{ip}", "{hostname}", ...).

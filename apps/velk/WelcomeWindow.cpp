@@ -59,6 +59,15 @@ const char* OriginText(StringFactory& factory, HostCtl::Network::Ipv6AddressType
     }
 }
 
+constexpr size_t kNetworkRows = 7;
+
+// Control characters of a host value become "?": the value stays on its line.
+std::string OneLine(std::string text) {
+    for (char& c : text)
+        if ((static_cast<unsigned char>(c) < 0x20) || c == 0x7f) c = '?';
+    return text;
+}
+
 bool FileExists(const char* hostPath) {
     struct stat st;
     return stat(HostCtl::Lib::HostPath(hostPath).c_str(), &st) == 0;
@@ -159,6 +168,7 @@ void WelcomeWindow::Fill() {
     bool ipv6Enabled = false;
     std::string hostname;
     bool noAdapter = false;
+    bool networkRead = false;
     QelCtl::Network::NetworkInfoImpl networkInfo;
     try {
         if (auto mgmt = GetManagementInterface()) {
@@ -171,6 +181,7 @@ void WelcomeWindow::Fill() {
         ipv6Enabled = networkInfo.IsQelIpv6Enabled();
         hostname = _dnsConfig.GetHostname();
         noAdapter = networkInfo.GetPnics().empty();
+        networkRead = true;
     } catch (const HostCtl::Lib::HostCtlException& e) {
         Syslog(LOG_ERR, "Unable to read the network configuration: %s", e.what());
         warning = e.what();
@@ -183,8 +194,12 @@ void WelcomeWindow::Fill() {
     }
 
     std::string network = _factory->GetString(141);
-    if (!hostname.empty() && hostname != "localhost") network += "\nhttp://" + hostname + "/ ";
-    if (!ipv4Off) {
+    // A host name is one line: control characters would split or move it.
+    if (!hostname.empty() && hostname != "localhost") network += "\nhttp://" + OneLine(hostname) + "/ ";
+    // An unreadable configuration has no address to show (the warning area
+    // says why); "0.0.0.0" would read like one.
+    if (!networkRead) {
+    } else if (!ipv4Off) {
         if (dhcp && address.IsZero()) {
             network += std::string("\n") + _factory->GetString(264);
             warning = _factory->GetString(142);
@@ -193,7 +208,20 @@ void WelcomeWindow::Fill() {
                        _factory->GetString(dhcp ? 261 : 262) + ")";
         }
     }
-    if (ipv6Enabled && !ipv6.empty()) network += "\n" + Ipv6Lines(ipv6, *_factory);
+    if (ipv6Enabled && !ipv6.empty()) {
+        // The list ends inside the area: when the rows left cannot take it
+        // whole, it is cut early to leave a row for the "..." line.
+        const size_t used = static_cast<size_t>(std::count(network.begin(), network.end(), '\n')) + 1;
+        const size_t rowsLeft = kNetworkRows > used ? kNetworkRows - used : 0;
+        const size_t rowsNeeded = ipv6.size() == 5 ? 5 : std::min<size_t>(ipv6.size(), 4) + (ipv6.size() > 5);
+        if (rowsNeeded <= rowsLeft) {
+            network += "\n" + Ipv6Lines(ipv6, *_factory);
+        } else if (rowsLeft > 0) {
+            const std::vector<HostCtl::Network::Ipv6Network> first(ipv6.begin(),
+                                                                   ipv6.begin() + (rowsLeft - 1));
+            network += "\n" + Ipv6Lines(first, *_factory) + "...";
+        }
+    }
     if (noAdapter) {
         network = kNoAdapterText;
         if (!_noAdapterAlertRaised) {
@@ -210,11 +238,12 @@ void WelcomeWindow::Fill() {
     std::string processors;
     try {
         QelCtl::Hardware::HardwareInfoImpl hardwareInfo;
-        hardware = CombineVendorAndProduct(hardwareInfo.GetVendorName(), hardwareInfo.GetProductName());
+        hardware =
+            OneLine(CombineVendorAndProduct(hardwareInfo.GetVendorName(), hardwareInfo.GetProductName()));
         QelCtl::Hardware::CpuInfoImpl cpu;
         const unsigned packages = cpu.GetNumCpuPackages();
-        processors =
-            packages >= 2 ? std::to_string(packages) + " x " + cpu.GetModelName() : cpu.GetModelName();
+        processors = OneLine(packages >= 2 ? std::to_string(packages) + " x " + cpu.GetModelName()
+                                           : cpu.GetModelName());
         processors += "\n" + FormatMemorySize(GetTotalMemoryBytes()) + "iB Memory";
     } catch (const HostCtl::Lib::HostCtlException& e) {
         Syslog(LOG_ERR, "Unable to read the hardware information: %s", e.what());
@@ -223,7 +252,7 @@ void WelcomeWindow::Fill() {
     if (!_title) _title = new TextArea(_upper, 8, 5, COLS - 16, 1, -1);
     if (!_hardware) _hardware = new TextArea(_upper, 8, 7, COLS - 16, 1, -1);
     if (!_processors) _processors = new TextArea(_upper, 8, 9, COLS - 16, 2, -1);
-    if (!_network) _network = new TextArea(_lower, 8, 1, COLS - 16, 7, BLACK);
+    if (!_network) _network = new TextArea(_lower, 8, 1, COLS - 16, kNetworkRows, BLACK);
     _network->SetText(network);
     _warning->SetText(warning);
     _title->SetText(_factory->GetString(2));

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "Console.hpp"
+#include "DisplayWidth.hpp"
 
 namespace Velk {
 
@@ -77,7 +78,9 @@ void Window::SetColors(int bg, int fg) {
 }
 
 void Window::Print(int x, int y, const std::string& text) {
-    if (_win && wmove(_win, y, x) != ERR) waddnstr(_win, text.c_str(), -1);
+    // Only what fits on the row is written: curses would carry the rest over
+    // to the next row, or across the frame's border.
+    if (_win && wmove(_win, y, x) != ERR) waddnstr(_win, CutToColumns(text, _width - x).c_str(), -1);
 }
 
 void Window::MoveCursor(int x, int y) {

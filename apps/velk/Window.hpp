@@ -27,6 +27,7 @@ public:
     static Window* NewChild(Window* parent, int x, int y, int width, int height, int bg, int fg);
 
     void SetColors(int bg, int fg);
+    // Writes text at x, y, cut to the columns left on the row.
     void Print(int x, int y, const std::string& text);
     void MoveCursor(int x, int y);
     static void SetCursor(bool on);

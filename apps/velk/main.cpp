@@ -82,6 +82,17 @@ int main(int argc, char** argv) {
 
     HostCtl::Lib::OpenLog("VELK", 0, LOG_USER);
     Syslog(LOG_INFO, "Starting VELK");
+    // Curses would end the process silently (its message goes to the
+    // silenced standard error): say why, on the terminal and in the log, and
+    // fail so that the supervisor sees a failed start.
+    const std::string problem = Velk::TerminalProblem();
+    if (!problem.empty()) {
+        Syslog(LOG_ERR, "Cannot start on this terminal: %s", problem.c_str());
+        const std::string line = "velk: cannot start: " + problem + "\r\n";
+        ssize_t ignored = write(1, line.data(), line.size());
+        (void)ignored;
+        return 1;
+    }
     WritePidFile();
 
     if (vt > 0) {
@@ -97,11 +108,13 @@ int main(int argc, char** argv) {
     atexit([] { endwin(); });
     curs_set(0);
     cbreak();
+    Velk::DisableFlowControl();
     noecho();
     keypad(stdscr, TRUE);
     Velk::InitColors();
     Velk::DefineKeys();
     refresh();
+    if (COLS < Velk::kMinColumns || LINES < Velk::kMinLines) Velk::Frame::RefuseSmallTerminal();
 
     Velk::WelcomeWindow* welcome = new Velk::WelcomeWindow();
     try {

@@ -1,6 +1,12 @@
 // "Configure Lockdown Mode" with the real console: the box shows the host
 // agent's setting each time the dialog opens, only a changed box asks the
 // agent for anything, and a refusal of the agent is only logged.
+#include <signal.h>
+
+#include <chrono>
+#include <fstream>
+#include <thread>
+
 #include "LoggedIn.hpp"
 
 namespace E2e {
@@ -116,6 +122,47 @@ TEST_F(LockdownTest, RefusalsAreLoggedWithTheToolsErrorAndChangeNothing) {
     EXPECT_EQ(host.Get("/hostAgent/lockdownEnabled"), true);
     ASSERT_TRUE(Open());
     EXPECT_TRUE(t->Shows("[X] Enable lockdown mode"));
+}
+
+// A tool that writes far more than a pipe holds is read while it runs: the
+// console keeps the start of its error and goes on (it used to wait for the
+// tool's end while the tool waited for the console to read).
+TEST_F(LockdownTest, AnErrorLargerThanAPipeIsReadWhileTheToolRuns) {
+    host.Fail("hrm-cmd hrmsvc/auth/lockdown_mode_enter", "Refused: " + std::string(100000, 'x'));
+    ASSERT_TRUE(Open());
+    ASSERT_TRUE(Press({" ", "Enter"}));
+    ASSERT_TRUE(WaitForLog(host, "Enabling lockdown mode failed"));
+    const std::vector<std::string> lines =
+        host.ConsoleLog("Enabling lockdown mode failed with error: Refused: x");
+    ASSERT_EQ(lines.size(), 1u);
+    // Only the first bytes of the output are kept.
+    EXPECT_LT(lines[0].size(), 512u) << lines[0].size();
+    ASSERT_TRUE(Open());
+    EXPECT_TRUE(t->Shows("[ ] Enable lockdown mode"));
+}
+
+// A termination signal while a host tool runs ends the tool and the console
+// at once: the console does not wait for the tool first.
+TEST_F(LockdownTest, TerminationDuringAToolEndsTheConsoleAtOnce) {
+    host.Slow("hrm-cmd hrmsvc/auth/lockdown_mode_enter", 60);
+    ASSERT_TRUE(Open());
+    t->Send(" ");
+    t->SendKey("Enter");
+    std::vector<std::pair<pid_t, char>> children;
+    for (int i = 0; i < 250 && children.empty(); ++i) {
+        std::this_thread::sleep_for(Duration(20));
+        children = t->Children();
+    }
+    ASSERT_EQ(children.size(), 1u) << "the tool did not start";
+    const auto start = std::chrono::steady_clock::now();
+    t->Signal(SIGTERM);
+    ASSERT_TRUE(t->ExitsWith(0, Duration(4000)));
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(3));
+    EXPECT_EQ(kill(children[0].first, 0) == 0 &&
+                  std::ifstream("/proc/" + std::to_string(children[0].first) + "/cmdline").peek() != EOF,
+              false)
+        << "the tool outlived the console";
+    EXPECT_EQ(host.Get("/hostAgent/lockdownEnabled"), false);
 }
 
 }  // namespace

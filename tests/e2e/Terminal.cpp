@@ -1,5 +1,6 @@
 #include "Terminal.hpp"
 
+#include <dirent.h>
 #include <fcntl.h>
 #include <poll.h>
 #include <pty.h>
@@ -256,6 +257,7 @@ void Terminal::ReaderLoop() {
 
 void Terminal::Feed(const char* data, size_t size) {
     _bytes += size;
+    _output.append(data, size);
     _lastOutput = Clock::now();
     std::string pass = _filter.Feed(std::string_view(data, size), _palette);
     if (!pass.empty()) vterm_input_write(_vt, pass.data(), pass.size());
@@ -607,6 +609,65 @@ std::optional<Rgb> Terminal::PaletteColor(int index) const {
 size_t Terminal::BytesReceived() const {
     std::lock_guard lock(_mutex);
     return _bytes;
+}
+
+std::string Terminal::Output() const {
+    std::lock_guard lock(_mutex);
+    return _output;
+}
+
+std::string Terminal::OutputSince(size_t from) const {
+    std::lock_guard lock(_mutex);
+    return from < _output.size() ? _output.substr(from) : std::string();
+}
+
+int Terminal::OpenDescriptors() const {
+    DIR* dir = opendir(("/proc/" + std::to_string(_pid) + "/fd").c_str());
+    if (!dir) return -1;
+    int count = 0;
+    while (const dirent* entry = readdir(dir))
+        if (entry->d_name[0] != '.') ++count;
+    closedir(dir);
+    return count;
+}
+
+long Terminal::ResidentKiB() const {
+    FILE* status = fopen(("/proc/" + std::to_string(_pid) + "/status").c_str(), "re");
+    if (!status) return -1;
+    long kib = -1;
+    char line[256];
+    while (fgets(line, sizeof line, status))
+        if (sscanf(line, "VmRSS: %ld kB", &kib) == 1) break;
+    fclose(status);
+    return kib;
+}
+
+std::vector<std::pair<pid_t, char>> Terminal::Children() const {
+    std::vector<std::pair<pid_t, char>> children;
+    const std::string proc = "/proc/" + std::to_string(_pid);
+    DIR* tasks = opendir((proc + "/task").c_str());
+    if (!tasks) return children;
+    while (const dirent* task = readdir(tasks)) {
+        if (task->d_name[0] == '.') continue;
+        FILE* list = fopen((proc + "/task/" + task->d_name + "/children").c_str(), "re");
+        if (!list) continue;
+        long child = 0;
+        while (fscanf(list, "%ld", &child) == 1) {
+            char state = '?';
+            if (FILE* stat = fopen(("/proc/" + std::to_string(child) + "/stat").c_str(), "re")) {
+                // "pid (name) S ...": the name may hold blanks and parentheses.
+                char buf[512];
+                const size_t n = fread(buf, 1, sizeof buf - 1, stat);
+                buf[n] = '\0';
+                if (const char* close = strrchr(buf, ')'); close && close[1] == ' ') state = close[2];
+                fclose(stat);
+            }
+            children.emplace_back(pid_t(child), state);
+        }
+        fclose(list);
+    }
+    closedir(tasks);
+    return children;
 }
 
 }  // namespace E2e

@@ -18,6 +18,7 @@
 #include <string>
 #include <string_view>
 #include <thread>
+#include <utility>
 #include <vector>
 
 struct VTerm;
@@ -171,6 +172,20 @@ public:
     // The colour last set for `index` since the last palette reset.
     std::optional<Rgb> PaletteColor(int index) const;
     size_t BytesReceived() const;
+    // Every byte the program wrote to the terminal so far, as it came (also
+    // what libvterm was not shown, such as palette sequences).
+    std::string Output() const;
+    // The bytes written from offset `from` of Output() on.
+    std::string OutputSince(size_t from) const;
+
+    // --- the program as a process ---
+    // Entries of /proc/PID/fd of the program (-1 once it has gone).
+    int OpenDescriptors() const;
+    // The program's resident set in KiB (VmRSS), -1 once it has gone.
+    long ResidentKiB() const;
+    // The direct children of the program with their process state letter
+    // ('S', 'R', 'Z', ...).
+    std::vector<std::pair<pid_t, char>> Children() const;
 
 private:
     void ReaderLoop();
@@ -199,6 +214,7 @@ private:
     int _cols, _rows;
     bool _eof = false;  // the pty's slave side is closed
     size_t _bytes = 0;
+    std::string _output;  // every byte received
     std::chrono::steady_clock::time_point _lastOutput;
     LinuxPaletteFilter _filter;
     std::vector<PaletteChange> _palette;

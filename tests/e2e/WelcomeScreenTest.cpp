@@ -257,6 +257,26 @@ const ValueCase kValueCases[] = {
                  "http://[2001:db8::3]/ (STATIC) http://[2001:db8::4]/ (STATIC) ...",
      {},
      {"2001:db8::5", "2001:db8::6"}},
+    // With the host-name and IPv4 lines, the list is cut early so that its
+    // "..." stays inside the seven rows of the area.
+    {"SixIpv6WithHostNameEndInsideTheArea",
+     {{"/network/vnics/0/ipv6/addresses", Ipv6List(6)}},
+     kDownload + " http://host1/ http://192.0.2.100/ (DHCP) http://[2001:db8::1]/ (STATIC) "
+                 "http://[2001:db8::2]/ (STATIC) http://[2001:db8::3]/ (STATIC) ...",
+     {"..."},
+     {"2001:db8::4"}},
+    {"HostNameWithLineEndsStaysOnItsLine",
+     {{"/network/dns/hostname", "lab\r\nrow"}},
+     kDownload + " http://lab??row/ http://192.0.2.100/ (DHCP) " + kLinkLocal},
+    // An unreadable configuration has no address to show; the reason is the
+    // warning.
+    {"UnreadableConfigurationShowsNoAddress",
+     {{"/faults", {{"GetVnicIpConfig", "the interface table is locked"}}}},
+     kDownload,
+     {"the interface table is locked"},
+     {"0.0.0.0", "(STATIC)"},
+     std::nullopt,
+     40},
     {"Ipv6Disabled",
      {{"/network/ipv6Enabled", false}},
      kDownload + " http://host1/ http://192.0.2.100/ (DHCP)",
@@ -284,6 +304,12 @@ const ValueCase kValueCases[] = {
      std::nullopt,
      {"1.5 TiB Memory"},
      {"GiB Memory"}},
+    // Pages times page size past 64 bits: the largest size, not a wrapped one.
+    {"MemoryBeyondSixtyFourBits",
+     {{"/hardware/memory/totalPages", 1ULL << 62}},
+     std::nullopt,
+     {"15.9 EiB Memory"},
+     {" MiB Memory"}},
 };
 
 // What the screen shows unlike the case expects; "" when nothing.

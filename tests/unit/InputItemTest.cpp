@@ -2,6 +2,11 @@
 #include <curses.h>
 #include <gtest/gtest.h>
 
+#include <malloc.h>
+#include <string.h>
+
+#include <atomic>
+#include <memory>
 #include <ostream>
 #include <string>
 #include <vector>
@@ -183,6 +188,77 @@ TEST_F(InputDrawTest, TypedBracesAreShownAsTyped) {
     for (char c : std::string("{ip}")) item.HandleKey(c);
     item.Draw(_area);
     EXPECT_EQ(Row(), "Name       {ip}     ");
+}
+
+}  // namespace
+
+// Every block freed while the watch is armed is searched for the watched
+// text: a secret copied into a temporary and freed unwiped is found here.
+namespace {
+std::atomic<const char*> watchedText{nullptr};
+std::atomic<int> freedCopies{0};
+
+// Any 12 characters of the watched text in a row count as a copy.
+void CheckFreed(void* block) {
+    constexpr size_t kPiece = 12;
+    const char* text = watchedText.load();
+    if (!block || !text) return;
+    const size_t size = malloc_usable_size(block);
+    const size_t length = strlen(text);
+    for (size_t at = 0; at + kPiece <= length; ++at) {
+        if (memmem(block, size, text + at, kPiece)) {
+            ++freedCopies;
+            return;
+        }
+    }
+}
+}  // namespace
+
+void* operator new(size_t size) {
+    void* block = malloc(size ? size : 1);
+    if (!block) throw std::bad_alloc();
+    return block;
+}
+void operator delete(void* block) noexcept {
+    CheckFreed(block);
+    free(block);
+}
+void operator delete(void* block, size_t) noexcept {
+    CheckFreed(block);
+    free(block);
+}
+
+namespace {
+
+TEST(InputItem, MaskedFieldLeavesNoCopyOfItsSecretInFreedMemory) {
+    testing_support::EnsureFakeTerminal();
+    // No 12 characters in a row repeat, so any piece of a copy is found.
+    std::string secret = "Sesame-";
+    for (int i = 1000; i < 1040; ++i) secret += std::to_string(i) + "-";
+    for (const bool wipeFirst : {true, false}) {
+        SCOPED_TRACE(wipeFirst ? "wiped, then closed" : "closed with the secret in it");
+        Velk::Window parent(0, 0, 80, 3, Velk::BLACK, Velk::WHITE);
+        auto* area = new Velk::TextArea(&parent, 1, 1, 78, 1, -1);
+        freedCopies = 0;
+        watchedText = secret.c_str();
+        {
+            // A field wide enough that a drawn piece of the text would not
+            // fit a string's inline buffer.
+            auto item = std::make_unique<InputItem>("Password:", "", 40);
+            item->SetMasked(true);
+            item->SetFocus(true);
+            for (const char c : secret) {
+                item->HandleKey(static_cast<unsigned char>(c));
+                item->Draw(area);
+            }
+            EXPECT_EQ(item->GetText(), secret);
+            EXPECT_EQ(testing_support::RowText(area->GetWindow(), 0).find_first_not_of("* ", 37),
+                      std::string::npos);
+            if (wipeFirst) item->WipeText();
+        }
+        watchedText = nullptr;
+        EXPECT_EQ(freedCopies.load(), 0);
+    }
 }
 
 }  // namespace

@@ -100,6 +100,22 @@ const LayoutCase kLayoutCases[] = {
     {"WideTextCountsCharacters", "\u2593\u2593\u2593\u2593\u2593", 4, "\u2593\u2593\u2593\u2593\n\u2593"},
     {"AccentedWordsWrap", "h\u00e9llo w\u00f6rld", 5, "h\u00e9llo\nw\u00f6rld"},
     {"RightAlignUtf8", "{align:right}\u2588{/align}", 3, "  \u2588"},
+    // Display columns: CJK takes two, combining characters none, bytes that
+    // are not UTF-8 one each, shown as U+FFFD.
+    {"CjkWrapsByColumns", "\u4e2d\u6587\u4e2d\u6587\u4e2d", 4, "\u4e2d\u6587\n\u4e2d\u6587\n\u4e2d"},
+    {"WideCharacterSkipsTheLastColumn", "abc\u4e2d", 4, "abc\n\u4e2d"},
+    {"CjkWordWrapsAtTheBlank", "ab \u4e2d\u6587", 5, "ab\n\u4e2d\u6587"},
+    {"BreakAtBlankLeavingTooLittleRoom", " ab\u4e2d", 3, " ab\n\u4e2d"},
+    {"CombiningStaysOnItsLine", "abcde\u0301f", 5, "abcde\u0301\nf"},
+    {"CombiningInsideAWord", "ae\u0301\u0308 b", 3, "ae\u0301\u0308\nb"},
+    {"RightAlignCountsColumns", "{align:right}\u4e2d{/align}", 5, "   \u4e2d"},
+    {"CenterCountsColumns", "{align:center}\u4e2d\u6587{/align}", 8, "  \u4e2d\u6587"},
+    {"PaddingCutsBeforeHalfAWideCharacter", "{align:padding:4}a\u4e2d\u6587b{/align}|", 10, "a\u4e2d |"},
+    {"PaddingDropsTheCutCharactersAccent", "{align:padding:1}ae\u0301{/align}|", 10, "a|"},
+    {"WiderThanTheAreaIsReplaced", "\u4e2d", 1, "\uFFFD"},
+    {"InvalidBytesAreReplaced", "a\xff\xe4\xb8Z", 10, "a\uFFFD\uFFFD\uFFFDZ"},
+    {"C1ControlIsReplaced", "a\xc2\x9bZ", 10, "a\uFFFDZ"},
+    {"DeleteDropped", "a\x7fZ", 10, "aZ"},
 };
 
 INSTANTIATE_TEST_SUITE_P(Cases, LayoutTest, ::testing::ValuesIn(kLayoutCases),
@@ -165,6 +181,26 @@ TEST_F(TextAreaDrawTest, WideCharactersTakeOneCellEach) {
     EXPECT_EQ(testing_support::CellText(win, 0, 2), "x");
     EXPECT_EQ(testing_support::CellPair(win, 0, 2), Pair(Velk::YELLOW, Velk::RED));
     EXPECT_EQ(testing_support::CellText(win, 0, 9), "\u00e9");
+}
+
+TEST_F(TextAreaDrawTest, CjkStaysInsideTheArea) {
+    // Five columns between marked cells of the parent: two CJK characters
+    // fill four, the third goes to the next row rather than over the mark.
+    WINDOW* outer = _parent->GetWindow();
+    for (int y = 0; y < 3; ++y) mvwaddstr(outer, y, 0, "#######");
+    auto* area = new TextArea(_parent, 1, 0, 5, 2, Velk::BLACK);
+    area->SetText("\u4e2d\u6587\u4e2d e\u0301\xff");
+    WINDOW* win = area->GetWindow();
+    EXPECT_EQ(testing_support::CellText(win, 0, 0), "\u4e2d");
+    EXPECT_EQ(testing_support::CellText(win, 0, 2), "\u6587");
+    EXPECT_EQ(testing_support::CellText(win, 0, 4), " ");
+    EXPECT_EQ(testing_support::CellText(win, 1, 0), "\u4e2d");
+    EXPECT_EQ(testing_support::CellText(win, 1, 3), "e\u0301");
+    EXPECT_EQ(testing_support::CellText(win, 1, 4), "\uFFFD");
+    for (int y = 0; y < 3; ++y) {
+        EXPECT_EQ(testing_support::CellText(outer, y, 0), "#") << "row " << y;
+        EXPECT_EQ(testing_support::CellText(outer, y, 6), "#") << "row " << y;
+    }
 }
 
 TEST_F(TextAreaDrawTest, SetAndAppendReplaceTheOldText) {

@@ -257,12 +257,15 @@ json SimState::Load(Identity& identity, bool mustExist) const {
         text.append(buf, size_t(n));
     }
 
+    if (JsonTextDepth(text, kMaxStateDepth) > kMaxStateDepth)
+        throw Error("arrays and objects nested deeper than " + std::to_string(kMaxStateDepth) + " levels");
     json state;
     try {
         state = json::parse(text);
-    } catch (const json::parse_error& e) {
+    } catch (const json::exception& e) {
         // Drop the library's "[json.exception.parse_error.N] " tag; keep "parse
-        // error at line L, column C: ...".
+        // error at line L, column C: ...". A number too large for a double
+        // ("1e400") is the library's out_of_range, not a parse_error.
         std::string what = e.what();
         size_t tagEnd = what.find("] ");
         throw Error(tagEnd == std::string::npos ? what : what.substr(tagEnd + 2));
@@ -322,6 +325,10 @@ void SimState::Replace(const json& state) {
 }
 
 void SimState::WriteLocked(const json& state) {
+    if (!state.is_object()) throw Error("cannot write: the state must be a JSON object");
+    if (JsonDepth(state, kMaxStateDepth) > kMaxStateDepth)
+        throw Error("cannot write: arrays and objects would nest deeper than " +
+                    std::to_string(kMaxStateDepth) + " levels");
     std::string text = state.dump(2, ' ', false, json::error_handler_t::replace) + "\n";
 
     std::string tmpPath = _statePath + ".XXXXXX";
@@ -379,6 +386,43 @@ void SimState::AppendHistory(json& state, json entry) const {
     entry["seq"] = last + 1;
     entry["time"] = UtcTimestamp();
     history.push_back(std::move(entry));
+    if (history.size() > kHistoryLimit)
+        history.erase(history.begin(), history.begin() + std::ptrdiff_t(history.size() - kHistoryLimit));
+}
+
+int JsonTextDepth(const std::string& text, int limit) {
+    int depth = 0;
+    int deepest = 0;
+    bool inString = false;
+    for (size_t i = 0; i < text.size(); ++i) {
+        const char c = text[i];
+        if (inString) {
+            if (c == '\\')
+                ++i;
+            else if (c == '"')
+                inString = false;
+        } else if (c == '"') {
+            inString = true;
+        } else if (c == '[' || c == '{') {
+            if (++depth > deepest) deepest = depth;
+            if (deepest > limit) break;
+        } else if ((c == ']' || c == '}') && depth > 0) {
+            --depth;
+        }
+    }
+    return deepest;
+}
+
+int JsonDepth(const json& value, int limit) {
+    if (!value.is_structured()) return 0;
+    if (limit <= 0) return 1;
+    int deepest = 0;
+    for (const json& child : value) {
+        const int depth = JsonDepth(child, limit - 1);
+        if (depth > deepest) deepest = depth;
+        if (deepest >= limit) break;
+    }
+    return deepest + 1;
 }
 
 const json& SimState::Field(const json& state, const std::string& pointer) const {

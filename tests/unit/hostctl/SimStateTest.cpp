@@ -149,6 +149,7 @@ TEST_F(SimStateTest, BrokenFilesGiveErrorsNamingTheFile) {
         {"{\"alert\": \"a\"", "parse error"},
         {"[1, 2]", "not a JSON object"},
         {"\"text\"", "not a JSON object"},
+        {"{\"alert\": 1e400}", "number overflow"},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.content ? c.content : "(missing)");
@@ -160,6 +161,57 @@ TEST_F(SimStateTest, BrokenFilesGiveErrorsNamingTheFile) {
         if (c.content) {
             EXPECT_EQ(ReadFile(StatePath()), c.content);  // left as it was
         }
+    }
+}
+
+// Nesting the parser would take but copying or writing the state would not
+// survive: refused as one clear error, the file left alone.
+TEST_F(SimStateTest, DeeplyNestedStateIsRefused) {
+    auto nested = [](size_t depth) { return std::string(depth, '[') + std::string(depth, ']'); };
+    const std::string cases[] = {
+        "{\"a\": " + nested(100000) + "}",
+        nested(100000),
+        "{\"a\": " + nested(size_t(HostCtl::Lib::kMaxStateDepth)) + "}",
+    };
+    for (const std::string& content : cases) {
+        SCOPED_TRACE(content.size());
+        WriteFile(StatePath(), content);
+        SimState state(Root());
+        ExpectStateError([&] { state.Read(); }, StatePath(), "nested deeper than");
+        ExpectStateError([&] { state.Update([](json&) {}); }, StatePath(), "nested deeper than");
+        EXPECT_EQ(ReadFile(StatePath()), content);
+    }
+    // Brackets inside strings are text, and the deepest allowed state is read.
+    const std::string inString = "{\"a\": \"" + std::string(100000, '[') +
+                                 "\\\"\", \"b\": " + nested(size_t(HostCtl::Lib::kMaxStateDepth) - 1) + "}";
+    WriteFile(StatePath(), inString);
+    EXPECT_EQ(SimState(Root()).Read()->at("a").get<std::string>().size(), 100001u);
+}
+
+TEST_F(SimStateTest, WriteThatWouldNestTooDeepIsRefused) {
+    const std::string before = ReadFile(StatePath());
+    SimState state(Root());
+    ExpectStateError(
+        [&] {
+            state.Update([](json& s) {
+                json* at = &s["deep"];
+                for (int i = 0; i < HostCtl::Lib::kMaxStateDepth + 10; ++i) at = &(*at)["x"];
+            });
+        },
+        StatePath(), "nest deeper than");
+    EXPECT_EQ(ReadFile(StatePath()), before);
+}
+
+TEST_F(SimStateTest, HistoryKeepsTheLatestEntries) {
+    SimState state(Root());
+    const size_t total = SimState::kHistoryLimit + 50;
+    for (size_t i = 0; i < total; ++i) state.Update([&](json& s) { state.AppendHistory(s, {{"call", i}}); });
+    const json& history = state.Read()->at("history");
+    ASSERT_EQ(history.size(), SimState::kHistoryLimit);
+    for (size_t i = 0; i < history.size(); ++i) {
+        const size_t call = total - SimState::kHistoryLimit + i;
+        EXPECT_EQ(history[i]["call"], call);
+        EXPECT_EQ(history[i]["seq"], call + 1);
     }
 }
 

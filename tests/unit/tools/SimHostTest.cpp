@@ -207,6 +207,7 @@ TEST_F(SimHostState, SetGetRemoveRoundTrip) {
         {"/network/dns/servers/-", "\"10.0.0.1\"", "/network/dns/servers/1", "\"10.0.0.1\""},
         {"/network/dns/servers/2", "\"10.0.0.2\"", "/network/dns/servers/2", "\"10.0.0.2\""},
         {"/network/pnics", "[]", "", "[]"},
+        {"/system/welcomeMessage", "1e400", "", "\"1e400\""},  // no double holds it: a string
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.pointer);
@@ -236,7 +237,16 @@ TEST_F(SimHostState, BadInputIsOneLineAndLeavesTheStateAlone) {
         const char* mentions;
     };
     const std::string missing = _dir + "/nohost";
+    // Nesting that would overflow the stack of a recursive reader or writer.
+    const std::string deepState = "{\"a\": " + std::string(100000, '[') + std::string(100000, ']') + "}";
+    const std::string deepValue = std::string(60000, '[') + std::string(60000, ']');
+    std::string deepPointer;
+    for (int i = 0; i < 600; ++i) deepPointer += "/a";
     const Case cases[] = {
+        {deepState.c_str(), {"get", _root, "/a"}, "host.json: arrays and objects nested deeper than"},
+        {deepState.c_str(), {"set", _root, "/a", "1"}, "host.json: arrays and objects nested deeper than"},
+        {nullptr, {"set", _root, "/a", deepValue}, "the value nests arrays and objects deeper than"},
+        {nullptr, {"set", _root, deepPointer, "1"}, "would nest deeper than"},
         {nullptr, {"get", missing, "/vms"}, "nohost/host.json"},
         {nullptr, {"set", missing, "/vms", "1"}, "nohost/host.json"},
         {"{\"network\": ", {"get", _root, "/network"}, "host.json: parse error"},

@@ -73,8 +73,11 @@ public:
     // Appends `entry` to the state's "/history" (created when missing), giving
     // it the time and a "seq" one above the highest seq already recorded, so
     // that the order of entries can be checked even after the list was
-    // edited. Call it inside Update: only there is the state the latest.
+    // edited. Only the last kHistoryLimit entries are kept: every call of the
+    // host's agents adds one, and the state is read again after each write.
+    // Call it inside Update: only there is the state the latest.
     void AppendHistory(nlohmann::json& state, nlohmann::json entry) const;
+    static constexpr size_t kHistoryLimit = 200;
 
     // An exception whose text is "<state file>: <problem>".
     HostCtlException Error(const std::string& problem) const;
@@ -102,6 +105,20 @@ private:
     Identity _cachedIdentity;
     std::shared_ptr<const nlohmann::json> _cached;
 };
+
+// The deepest nesting of arrays and objects a state may have. JSON values are
+// copied, compared and written out recursively, so a state nested much deeper
+// would overflow the stack; Read refuses such a file and writes refuse to
+// produce one.
+constexpr int kMaxStateDepth = 512;
+
+// How deeply arrays and objects nest in JSON text, counted without parsing it
+// (brackets inside strings do not count). Counting stops above `limit`.
+int JsonTextDepth(const std::string& text, int limit);
+
+// How deeply arrays and objects nest in a value (a scalar is 0). Counting
+// stops above `limit`, so the recursion stays bounded.
+int JsonDepth(const nlohmann::json& value, int limit);
 
 // The state a freshly created simulated host starts with. A host name that
 // holds a dot ("esx1.lab.test") also sets the domain.

@@ -1,0 +1,289 @@
+// Signals under load: a flood of refresh signals while keys arrive loses no
+// key and no screen update; the signals that end the console end it cleanly
+// whenever they come, with the terminal as it was before the start.
+#include <pty.h>
+#include <signal.h>
+#include <unistd.h>
+#include <vterm.h>
+
+#include <atomic>
+#include <functional>
+
+#include "LoggedIn.hpp"
+
+namespace E2e {
+namespace {
+
+// Sends SIGUSR1 to `pid` in a tight loop from a thread of its own, until
+// destroyed.
+class SignalFlood {
+public:
+    SignalFlood(pid_t pid, int sig)
+        : _thread([this, pid, sig] {
+              while (!_stop.load()) {
+                  if (kill(pid, sig) != 0) return;
+                  _sent.fetch_add(1);
+              }
+          }) {}
+    ~SignalFlood() { Stop(); }
+    long Stop() {
+        _stop = true;
+        if (_thread.joinable()) _thread.join();
+        return _sent.load();
+    }
+    long Sent() const { return _sent.load(); }
+
+private:
+    std::atomic<bool> _stop{false};
+    std::atomic<long> _sent{0};
+    std::thread _thread;
+};
+
+// Sends `count` keys with a short pause between them while the flood runs,
+// and keeps the flood going until it has sent at least `least` signals.
+long TypeUnderFlood(Terminal& t, const std::vector<std::string>& keys, long least) {
+    SignalFlood flood(t.Pid(), SIGUSR1);
+    for (const std::string& key : keys) {
+        t.Send(key);
+        std::this_thread::sleep_for(Duration(3));
+    }
+    const auto end = std::chrono::steady_clock::now() + Duration(20000);
+    while (flood.Sent() < least && std::chrono::steady_clock::now() < end)
+        std::this_thread::sleep_for(Duration(5));
+    return flood.Stop();
+}
+
+using SignalLoadTest = ConsoleTest;
+
+TEST_F(SignalLoadTest, TypingIntoTheLoginNameLosesNoKey) {
+    ASSERT_TRUE(Start());
+    t->SendKey("F2");
+    ASSERT_TRUE(t->WaitForText("Login Name:"));
+    const std::string typed = "flood-Typed_0123456789";
+    std::vector<std::string> keys;
+    for (char c : typed) keys.emplace_back(1, c);
+    const long sent = TypeUnderFlood(*t, keys, 2000);
+    EXPECT_GE(sent, 2000);
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    const auto label = t->Find("Login Name:");
+    ASSERT_TRUE(label);
+    // The typed text replaced the prefilled name and stands in the field alone.
+    const std::string row = t->RowText(label->row);
+    const size_t at = row.find(typed);
+    ASSERT_NE(at, std::string::npos) << t->Dump();
+    EXPECT_EQ(row.find("root"), std::string::npos) << t->Dump();
+    EXPECT_FALSE(t->HasExited());
+
+    // Editing keys under the flood: five Backspaces take off five characters.
+    const long again = TypeUnderFlood(*t, std::vector<std::string>(5, "\x7f"), 1000);
+    EXPECT_GE(again, 1000);
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    const std::string shortened = t->RowText(label->row);
+    EXPECT_NE(shortened.find(typed.substr(0, typed.size() - 5) + " "), std::string::npos) << t->Dump();
+    EXPECT_EQ(shortened.find(typed), std::string::npos) << t->Dump();
+}
+
+TEST_F(SignalLoadTest, WalkingTheMenuLosesNoKey) {
+    ASSERT_TRUE(StartInMenu());
+    // The entries in order, from a walk without signals.
+    std::vector<std::string> entries;
+    const auto heading = [&] { return t->RowTextTrimmed(2); };
+    for (int i = 0; i < 6; ++i) {
+        ASSERT_TRUE(t->WaitQuiet());
+        entries.push_back(heading());
+        t->SendKey("Down");
+    }
+    ASSERT_TRUE(t->WaitQuiet());
+    for (int i = 0; i < 6; ++i) t->SendKey("Up");
+    ASSERT_TRUE(t->WaitQuiet(Duration(200)));
+    ASSERT_EQ(heading(), entries[0]) << t->Dump();
+
+    // The same walk under the flood, down and back, several times.
+    for (int round = 0; round < 3; ++round) {
+        std::vector<std::string> downs(5, Terminal::TerminfoString(t->Term(), "kcud1"));
+        TypeUnderFlood(*t, downs, 500);
+        ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+        ASSERT_EQ(heading(), entries[5]) << "round " << round << "\n" << t->Dump();
+        std::vector<std::string> ups(3, Terminal::TerminfoString(t->Term(), "kcuu1"));
+        TypeUnderFlood(*t, ups, 500);
+        ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+        ASSERT_EQ(heading(), entries[2]) << "round " << round << "\n" << t->Dump();
+        TypeUnderFlood(*t, std::vector<std::string>(2, Terminal::TerminfoString(t->Term(), "kcuu1")), 200);
+        ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+        ASSERT_EQ(heading(), entries[0]) << "round " << round << "\n" << t->Dump();
+    }
+    EXPECT_FALSE(t->HasExited());
+}
+
+// The terminal state the output leaves behind, read by a terminal of its own:
+// whether the cursor shows and whether any attribute is still on.
+struct EndState {
+    bool cursorVisible = true;
+    bool attributes = false;
+    std::string detail;
+};
+
+EndState ReadEndState(const std::string& output, int cols, int rows) {
+    VTerm* vt = vterm_new(rows, cols);
+    vterm_set_utf8(vt, 1);
+    VTermState* state = vterm_obtain_state(vt);
+    EndState end;
+    static VTermStateCallbacks callbacks = {};
+    callbacks.settermprop = [](VTermProp prop, VTermValue* value, void* user) {
+        if (prop == VTERM_PROP_CURSORVISIBLE) static_cast<EndState*>(user)->cursorVisible = value->boolean;
+        return 1;
+    };
+    vterm_state_set_callbacks(state, &callbacks, &end);
+    vterm_state_reset(state, 1);
+    LinuxPaletteFilter filter;
+    std::vector<PaletteChange> ignored;
+    const std::string pass = filter.Feed(output, ignored);
+    vterm_input_write(vt, pass.data(), pass.size());
+    for (const auto& [attr, name] :
+         {std::pair{VTERM_ATTR_BOLD, "bold"}, std::pair{VTERM_ATTR_UNDERLINE, "underline"},
+          std::pair{VTERM_ATTR_BLINK, "blink"}, std::pair{VTERM_ATTR_REVERSE, "reverse"}}) {
+        VTermValue value = {};
+        vterm_state_get_penattr(state, attr, &value);
+        if (value.number != 0) {
+            end.attributes = true;
+            end.detail += std::string(name) + " ";
+        }
+    }
+    for (const auto& [attr, name] :
+         {std::pair{VTERM_ATTR_FOREGROUND, "foreground"}, std::pair{VTERM_ATTR_BACKGROUND, "background"}}) {
+        VTermValue value = {};
+        vterm_state_get_penattr(state, attr, &value);
+        const bool isDefault = attr == VTERM_ATTR_FOREGROUND ? VTERM_COLOR_IS_DEFAULT_FG(&value.color)
+                                                             : VTERM_COLOR_IS_DEFAULT_BG(&value.color);
+        if (!isDefault) {
+            end.attributes = true;
+            end.detail += std::string(name) + " ";
+        }
+    }
+    vterm_free(vt);
+    return end;
+}
+
+// The modes of a fresh pseudo-terminal: what the console found at its start.
+struct termios FreshModes() {
+    int master = -1, slave = -1;
+    struct termios modes = {};
+    if (openpty(&master, &slave, nullptr, nullptr, nullptr) == 0) {
+        tcgetattr(master, &modes);
+        close(master);
+        close(slave);
+    }
+    return modes;
+}
+
+::testing::AssertionResult SameModes(const struct termios& want, const struct termios& got) {
+    auto failure = ::testing::AssertionFailure();
+    bool same = true;
+    auto flags = [&](const char* name, tcflag_t w, tcflag_t g) {
+        if (w == g) return;
+        same = false;
+        failure << name << " " << std::hex << g << " instead of " << w << std::dec << "; ";
+    };
+    flags("c_iflag", want.c_iflag, got.c_iflag);
+    flags("c_oflag", want.c_oflag, got.c_oflag);
+    flags("c_cflag", want.c_cflag, got.c_cflag);
+    flags("c_lflag", want.c_lflag, got.c_lflag);
+    for (size_t i = 0; i < NCCS; ++i) {
+        if (want.c_cc[i] == got.c_cc[i]) continue;
+        same = false;
+        failure << "c_cc[" << i << "] " << int(got.c_cc[i]) << " instead of " << int(want.c_cc[i]) << "; ";
+    }
+    return same ? ::testing::AssertionSuccess() : failure;
+}
+
+// A moment at which an ending signal comes: `prepare` brings the console
+// there (possibly logging in), `delay` later the signal is sent.
+struct EndMoment {
+    const char* name;
+    int sig;
+    const char* term;
+    std::function<::testing::AssertionResult(ConsoleTest&, Terminal&)> prepare;
+    int delayMs;
+    // Keys sent after the signal ("" for none): a session ends before the
+    // console does.
+    const char* then = "";
+};
+void PrintTo(const EndMoment& m, std::ostream* os) { *os << m.name; }
+
+using EndingSignalTest = ConsoleTestWithParam<EndMoment>;
+
+::testing::AssertionResult FirstOutput(ConsoleTest&, Terminal& t) {
+    const auto end = std::chrono::steady_clock::now() + kDefaultTimeout;
+    while (t.BytesReceived() == 0 && std::chrono::steady_clock::now() < end)
+        std::this_thread::sleep_for(Duration(1));
+    return ::testing::AssertionSuccess();
+}
+::testing::AssertionResult Welcome(ConsoleTest&, Terminal& t) { return WaitForWelcome(t); }
+::testing::AssertionResult LoginDialog(ConsoleTest&, Terminal& t) {
+    if (auto welcome = WaitForWelcome(t); !welcome) return welcome;
+    t.SendKey("F2");
+    return t.WaitForText("Login Name:");
+}
+::testing::AssertionResult TypingName(ConsoleTest& c, Terminal& t) {
+    if (auto dialog = LoginDialog(c, t); !dialog) return dialog;
+    // Keys still being handled when the signal comes.
+    t.Send("abcdefghijklmnopqrstuvwxyz");
+    return ::testing::AssertionSuccess();
+}
+::testing::AssertionResult RefreshBurst(ConsoleTest&, Terminal& t) {
+    if (auto welcome = WaitForWelcome(t); !welcome) return welcome;
+    for (int i = 0; i < 200; ++i) t.Signal(SIGUSR1);
+    return ::testing::AssertionSuccess();
+}
+::testing::AssertionResult InMenu(ConsoleTest&, Terminal& t) {
+    if (auto welcome = WaitForWelcome(t); !welcome) return welcome;
+    return LogInToMenu(t);
+}
+::testing::AssertionResult WalkingMenu(ConsoleTest& c, Terminal& t) {
+    if (auto menu = InMenu(c, t); !menu) return menu;
+    for (int i = 0; i < 8; ++i) t.SendKey("Down");
+    return ::testing::AssertionSuccess();
+}
+
+TEST_P(EndingSignalTest, EndsWithStatusZeroAndTheTerminalRestored) {
+    const EndMoment& m = GetParam();
+    const struct termios before = FreshModes();
+    t.emplace(PamConsole(host, m.term));
+    ASSERT_TRUE(m.prepare(*this, *t));
+    if (m.delayMs > 0) std::this_thread::sleep_for(Duration(m.delayMs));
+    t->Signal(m.sig);
+    if (*m.then) {
+        ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+        EXPECT_FALSE(t->HasExited()) << "ended during the session";
+        t->SendKey(m.then);
+    }
+    ASSERT_TRUE(t->ExitsWith(0));
+    EXPECT_TRUE(SameModes(before, t->Modes()));
+    const EndState end = ReadEndState(t->Output(), t->Cols(), t->Rows());
+    EXPECT_TRUE(end.cursorVisible) << "the cursor is left hidden";
+    EXPECT_FALSE(end.attributes) << "attributes left on: " << end.detail;
+}
+
+const EndMoment kEndMoments[] = {
+    {"WinchAtFirstOutput", SIGWINCH, "linux", FirstOutput, 0},
+    {"WinchOnWelcome", SIGWINCH, "linux", Welcome, 0},
+    {"WinchInLoginDialog", SIGWINCH, "xterm-256color", LoginDialog, 0},
+    {"WinchWhileTyping", SIGWINCH, "linux", TypingName, 0},
+    {"WinchWhileTypingLater", SIGWINCH, "linux", TypingName, 15},
+    {"WinchAfterRefreshBurst", SIGWINCH, "linux", RefreshBurst, 0},
+    {"WinchInMenu", SIGWINCH, "linux", InMenu, 0},
+    {"WinchWhileWalkingMenu", SIGWINCH, "xterm-256color", WalkingMenu, 5},
+    {"Usr2AtFirstOutput", SIGUSR2, "linux", FirstOutput, 0},
+    {"Usr2OnWelcome", SIGUSR2, "xterm-256color", Welcome, 0},
+    {"Usr2InLoginDialog", SIGUSR2, "linux", LoginDialog, 0},
+    {"Usr2WhileTyping", SIGUSR2, "linux", TypingName, 0},
+    {"Usr2WhileTypingLater", SIGUSR2, "vt100", TypingName, 15},
+    {"Usr2AfterRefreshBurst", SIGUSR2, "linux", RefreshBurst, 0},
+    {"Usr2InMenuEndsAtLogOut", SIGUSR2, "linux", InMenu, 0, "Esc"},
+};
+
+INSTANTIATE_TEST_SUITE_P(Moments, EndingSignalTest, ::testing::ValuesIn(kEndMoments),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+}  // namespace
+}  // namespace E2e

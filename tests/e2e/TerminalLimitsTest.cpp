@@ -1,0 +1,155 @@
+// Terminals the console cannot use, or only partly: it says why (on the
+// terminal and in the log) instead of ending silently or drawing garbage,
+// takes no keys for screens nobody can see, and never freezes on a stray
+// flow-control key.
+#include <fcntl.h>
+#include <signal.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <thread>
+
+#include "SimHost.hpp"
+#include "Terminal.hpp"
+
+namespace E2e {
+namespace {
+
+struct RefusedTerm {
+    const char* name;
+    const char* term;
+    const char* reason;  // what the message and the log line say
+};
+void PrintTo(const RefusedTerm& c, std::ostream* os) { *os << c.name; }
+
+class RefusedTermTest : public ::testing::TestWithParam<RefusedTerm> {};
+
+TEST_P(RefusedTermTest, SaysWhyAndFailsTheStart) {
+    SimHost host;
+    Terminal t(host.Console(GetParam().term));
+    ASSERT_TRUE(t.ExitsWith(1));
+    const std::string message = std::string("velk: cannot start: ") + GetParam().reason;
+    EXPECT_TRUE(t.Shows(message));
+    EXPECT_EQ(
+        host.ConsoleLog(std::string("user.err: Cannot start on this terminal: ") + GetParam().reason, t.Pid())
+            .size(),
+        1u);
+    // An instance that never ran does not take the PID file.
+    EXPECT_FALSE(host.Exists("/var/run/velk.pid"));
+}
+
+INSTANTIATE_TEST_SUITE_P(Terms, RefusedTermTest,
+                         ::testing::Values(RefusedTerm{"Empty", "", "TERM is not set"},
+                                           RefusedTerm{"Unknown", "no-such-terminal-type",
+                                                       "unknown terminal type \"no-such-terminal-type\""},
+                                           RefusedTerm{"Dumb", "dumb",
+                                                       "terminal type \"dumb\" cannot place the cursor"}),
+                         [](const auto& info) { return std::string(info.param.name); });
+
+// Standard input at its end from the start (no terminal at all): a clear
+// refusal, not a loop on the end of input.
+TEST(NoTerminalTest, InputFromDevNullIsRefusedAtOnce) {
+    SimHost host;
+    int out[2];
+    ASSERT_EQ(pipe(out), 0);
+    posix_spawn_file_actions_t actions;
+    posix_spawn_file_actions_init(&actions);
+    posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
+    posix_spawn_file_actions_adddup2(&actions, out[1], 1);
+    posix_spawn_file_actions_addclose(&actions, out[0]);
+    const std::string root = "VELK_HOST_ROOT=" + host.Root();
+    std::vector<std::string> envStrings = {root, "TERM=linux", "LANG=C.UTF-8"};
+    for (const char* name : {"ASAN_OPTIONS", "UBSAN_OPTIONS", "LSAN_OPTIONS"})
+        if (const char* value = getenv(name)) envStrings.push_back(std::string(name) + "=" + value);
+    std::vector<char*> env;
+    for (std::string& e : envStrings) env.push_back(e.data());
+    env.push_back(nullptr);
+    char program[] = VELK_BIN;
+    char* argv[] = {program, nullptr};
+    pid_t pid = -1;
+    ASSERT_EQ(posix_spawn(&pid, VELK_BIN, &actions, nullptr, argv, env.data()), 0);
+    posix_spawn_file_actions_destroy(&actions);
+    close(out[1]);
+
+    int status = -1;
+    const auto deadline = std::chrono::steady_clock::now() + kDefaultTimeout;
+    while (waitpid(pid, &status, WNOHANG) == 0) {
+        if (std::chrono::steady_clock::now() > deadline) {
+            kill(pid, SIGKILL);
+            waitpid(pid, &status, 0);
+            FAIL() << "the console kept running with no terminal";
+        }
+        std::this_thread::sleep_for(Duration(20));
+    }
+    std::string said(256, '\0');
+    const ssize_t n = read(out[0], said.data(), said.size());
+    close(out[0]);
+    said.resize(n > 0 ? static_cast<size_t>(n) : 0);
+    ASSERT_TRUE(WIFEXITED(status)) << Terminal::DescribeStatus(status);
+    EXPECT_EQ(WEXITSTATUS(status), 1);
+    EXPECT_EQ(said, "velk: cannot start: standard input and output must be a terminal\r\n");
+}
+
+struct Size {
+    int cols, rows;
+};
+void PrintTo(const Size& s, std::ostream* os) { *os << s.cols << "x" << s.rows; }
+
+class SmallTerminalTest : public ::testing::TestWithParam<Size> {};
+
+// Below the smallest size every dialog fits in, nothing is drawn but the
+// notice and no key is taken: a blind F2, name and password open no dialog
+// and log nobody in. Signals still end the console.
+TEST_P(SmallTerminalTest, ShowsTheNoticeAndTakesNoKeys) {
+    SimHost host;
+    Terminal t(host.Console("linux", GetParam().cols, GetParam().rows));
+    ASSERT_TRUE(t.WaitForText("Terminal too small"));
+    EXPECT_NE(t.RegionText(0, 0, t.Cols(), t.Rows()).find("at least 78 columns and 23 lines"),
+              std::string::npos)
+        << t.Dump();
+    t.SendKey("F2");
+    t.Send("root\tsecret\r");
+    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
+    EXPECT_TRUE(t.Shows("too small"));
+    EXPECT_TRUE(host.ConsoleLog("Authentication").empty());
+    EXPECT_EQ(host.ConsoleLog("Terminal too small: " + std::to_string(GetParam().cols) + "x" +
+                                  std::to_string(GetParam().rows) + ", the console needs at least 78x23",
+                              t.Pid())
+                  .size(),
+              1u);
+    t.Signal(SIGTERM);
+    EXPECT_TRUE(t.ExitsWith(0));
+}
+
+INSTANTIATE_TEST_SUITE_P(Sizes, SmallTerminalTest,
+                         ::testing::Values(Size{20, 5}, Size{40, 10}, Size{77, 25}, Size{80, 22}));
+
+// The smallest usable size and a very large one both carry the welcome screen.
+TEST(UsableTerminalTest, SmallestAndLargeSizesShowTheWelcomeScreen) {
+    for (const Size size : {Size{78, 23}, Size{300, 100}}) {
+        SimHost host;
+        Terminal t(host.Console("linux", size.cols, size.rows));
+        ASSERT_TRUE(t.WaitForText("Shut Down/Restart")) << size.cols << "x" << size.rows;
+        EXPECT_TRUE(t.Lacks("too small"));
+    }
+}
+
+// Ctrl-S stops nothing: the next key still opens the login dialog, and the
+// termination signal ends the console at once.
+TEST(FlowControlTest, CtrlSDoesNotFreezeTheConsole) {
+    SimHost host;
+    Terminal t(host.Console());
+    ASSERT_TRUE(t.WaitForText("Shut Down/Restart"));
+    EXPECT_EQ(t.Modes().c_iflag & IXON, 0u);
+    t.Send("\x13");
+    t.SendKey("F2");
+    ASSERT_TRUE(t.WaitForText("Login Name"));
+    t.Send("\x13");
+    t.Signal(SIGTERM);
+    EXPECT_TRUE(t.ExitsWith(0, Duration(3000)));
+}
+
+}  // namespace
+}  // namespace E2e
