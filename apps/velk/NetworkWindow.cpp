@@ -11,6 +11,7 @@
 #include "CommandRunner.hpp"
 #include "Console.hpp"
 #include "DNSConfigurationDialog.hpp"
+#include "DisplayWidth.hpp"
 #include "IPConfigurationDialog.hpp"
 #include "IPv6ConfigurationDialog.hpp"
 #include "ManagementInterface.hpp"
@@ -381,7 +382,7 @@ void NetworkWindow::Step(const char* format, ...) {
     // The same line on the status row, sent at once: the host may take a
     // while with the step.
     _statusLine->Erase();
-    _statusLine->Print(1, 0, std::string(line).substr(0, size_t(std::max(0, COLS - 2))));
+    _statusLine->Print(1, 0, CutToColumns(line, std::max(0, COLS - 2)));
     _statusLine->Refresh();
     Window::Flush();
 }

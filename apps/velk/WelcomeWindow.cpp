@@ -195,7 +195,8 @@ void WelcomeWindow::Fill() {
 
     std::string network = _factory->GetString(141);
     // A host name is one line: control characters would split or move it.
-    if (!hostname.empty() && hostname != "localhost") network += "\nhttp://" + OneLine(hostname) + "/ ";
+    if (!hostname.empty() && hostname != "localhost")
+        network += "\nhttp://" + TextArea::Escape(OneLine(hostname)) + "/ ";
     // An unreadable configuration has no address to show (the warning area
     // says why); "0.0.0.0" would read like one.
     if (!networkRead) {
@@ -238,12 +239,14 @@ void WelcomeWindow::Fill() {
     std::string processors;
     try {
         QelCtl::Hardware::HardwareInfoImpl hardwareInfo;
-        hardware =
-            OneLine(CombineVendorAndProduct(hardwareInfo.GetVendorName(), hardwareInfo.GetProductName()));
+        // Vendor, product and CPU model are the firmware's text, shown as
+        // they stand: a "{" in them is not mark-up.
+        hardware = TextArea::Escape(
+            OneLine(CombineVendorAndProduct(hardwareInfo.GetVendorName(), hardwareInfo.GetProductName())));
         QelCtl::Hardware::CpuInfoImpl cpu;
         const unsigned packages = cpu.GetNumCpuPackages();
-        processors = OneLine(packages >= 2 ? std::to_string(packages) + " x " + cpu.GetModelName()
-                                           : cpu.GetModelName());
+        processors = TextArea::Escape(OneLine(
+            packages >= 2 ? std::to_string(packages) + " x " + cpu.GetModelName() : cpu.GetModelName()));
         processors += "\n" + FormatMemorySize(GetTotalMemoryBytes()) + "iB Memory";
     } catch (const HostCtl::Lib::HostCtlException& e) {
         Syslog(LOG_ERR, "Unable to read the hardware information: %s", e.what());

@@ -82,7 +82,12 @@ TerminalOptions PamConsole(const SimHost& host, const std::string& term, int col
 ::testing::AssertionResult SelectEntry(Terminal& t, const std::string& entry, bool up) {
     for (int moves = 0; moves < 20; ++moves) {
         if (t.FindAll(entry).size() >= 2) return ::testing::AssertionSuccess();
+        // The bar's move is on the screen before the next look: a console
+        // slower than the quiet period (a loaded machine, the sanitizers)
+        // would otherwise be sent keys for a screen it has not drawn yet.
+        const size_t before = t.BytesReceived();
         t.SendKey(up ? "Up" : "Down");
+        Poll([&] { return t.BytesReceived() > before; }, Duration(3000));
         if (auto quiet = t.WaitQuiet(); !quiet) return quiet;
     }
     return ::testing::AssertionFailure() << "\"" << entry << "\" never got selected\n" << t.Dump();
