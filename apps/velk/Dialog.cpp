@@ -57,6 +57,30 @@ int Dialog::RunForm(const std::function<void()>& draw, const std::function<bool(
     }
 }
 
+int Dialog::RunList(ItemList* list, const std::function<void()>& toggle,
+                    const std::function<std::optional<int>()>& accept) {
+    for (;;) {
+        switch (GetKey(true)) {
+            case KEY_UP:
+                list->Up();
+                break;
+            case KEY_DOWN:
+                list->Down();
+                break;
+            case ' ':
+                toggle();
+                break;
+            case '\n':
+                if (const std::optional<int> result = accept()) return *result;
+                break;
+            case 27:
+                return 0;
+            default:
+                break;
+        }
+    }
+}
+
 ItemList* Dialog::NewContentList(const std::vector<Item*>& items) {
     auto* list = new ItemList(_content, 0, 0, _content->GetWidth(), _content->GetHeight());
     list->SetItems(items);

@@ -4,6 +4,7 @@
 #pragma once
 
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -48,6 +49,12 @@ protected:
     // The text cursor is hidden when the loop ends.
     int RunForm(const std::function<void()>& draw, const std::function<bool()>& accept,
                 const std::function<void(int)>& onKey);
+
+    // The key loop of a list dialog: Up and Down move `list`'s bar, Space
+    // calls `toggle`, Enter ends the loop with what `accept` returns (when it
+    // returns a value) and Esc with 0; other keys are ignored.
+    int RunList(ItemList* list, const std::function<void()>& toggle,
+                const std::function<std::optional<int>()>& accept);
 
     // A list filling the content window, showing `items` (still owned by
     // the caller); the caller deletes the list.

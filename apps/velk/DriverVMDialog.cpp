@@ -52,37 +52,23 @@ void DriverVMDialog::ToggleCurrent() {
 
 int DriverVMDialog::Run() {
     Draw();
-    for (;;) {
-        const int key = GetKey(true);
-        switch (key) {
-            case ' ':
-                ToggleCurrent();
-                Draw();
-                break;
-            case KEY_DOWN:
-                _list->Down();
-                break;
-            case KEY_UP:
-                _list->Up();
-                break;
-            case '\n': {
-                std::vector<std::string> owned;
-                std::string shown;
-                for (size_t i = 0; i < _items.size(); ++i) {
-                    if (!_items[i]->IsChecked()) continue;
-                    owned.push_back(_devices[i].id);
-                    shown += (shown.empty() ? "" : ", ") + _devices[i].id;
-                }
-                QelCtl::Hardware::DriverVmInfoImpl().SetOwned(owned);
-                HostCtl::Lib::Syslog(LOG_INFO, "DriverVM devices set to %s", shown.c_str());
-                return 1;
-            }
-            case 27:
-                return 0;
-            default:
-                break;
+    const auto toggle = [this] {
+        ToggleCurrent();
+        Draw();
+    };
+    const auto apply = [this]() -> std::optional<int> {
+        std::vector<std::string> owned;
+        std::string shown;
+        for (size_t i = 0; i < _items.size(); ++i) {
+            if (!_items[i]->IsChecked()) continue;
+            owned.push_back(_devices[i].id);
+            shown += (shown.empty() ? "" : ", ") + _devices[i].id;
         }
-    }
+        QelCtl::Hardware::DriverVmInfoImpl().SetOwned(owned);
+        HostCtl::Lib::Syslog(LOG_INFO, "DriverVM devices set to %s", shown.c_str());
+        return 1;
+    };
+    return RunList(_list, toggle, apply);
 }
 
 }  // namespace Velk

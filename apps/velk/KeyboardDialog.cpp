@@ -32,40 +32,25 @@ int KeyboardDialog::Run() {
     _list->Draw();
     SetFooter(TOGGLE_LIST_FOOTER);
     Refresh();
-    for (;;) {
-        const int key = GetKey(true);
-        switch (key) {
-            case ' ': {
-                const int current = _list->GetCurrentIndex();
-                if (current < 0) break;
-                _items[_checkedIndex]->SetSelected(false);
-                _checkedIndex = static_cast<size_t>(current);
-                _items[_checkedIndex]->SetSelected(true);
-                _list->Draw();
-                break;
-            }
-            case KEY_DOWN:
-                _list->Down();
-                break;
-            case KEY_UP:
-                _list->Up();
-                break;
-            case '\n': {
-                if (_layouts.empty()) break;
-                // The marked layout is applied, not the one under the cursor,
-                // and the host is told again even when nothing changed.
-                const std::string& layout = _layouts[_checkedIndex];
-                _systemInfo.SetKeyboardLayout(layout);
-                _systemInfo.LoadKeyboardMappings(layout);
-                HostCtl::Lib::Syslog(LOG_INFO, "Keyboard Layout changed to %s", layout.c_str());
-                return 1;
-            }
-            case 27:
-                return 0;
-            default:
-                break;
-        }
-    }
+    const auto mark = [this] {
+        const int current = _list->GetCurrentIndex();
+        if (current < 0) return;
+        _items[_checkedIndex]->SetSelected(false);
+        _checkedIndex = static_cast<size_t>(current);
+        _items[_checkedIndex]->SetSelected(true);
+        _list->Draw();
+    };
+    const auto apply = [this]() -> std::optional<int> {
+        if (_layouts.empty()) return std::nullopt;
+        // The marked layout is applied, not the one under the cursor, and
+        // the host is told again even when nothing changed.
+        const std::string& layout = _layouts[_checkedIndex];
+        _systemInfo.SetKeyboardLayout(layout);
+        _systemInfo.LoadKeyboardMappings(layout);
+        HostCtl::Lib::Syslog(LOG_INFO, "Keyboard Layout changed to %s", layout.c_str());
+        return 1;
+    };
+    return RunList(_list, mark, apply);
 }
 
 }  // namespace Velk

@@ -42,29 +42,17 @@ void LockdownDialog::Draw() {
 
 int LockdownDialog::Run() {
     Draw();
-    for (;;) {
-        switch (GetKey(true)) {
-            case ' ':
-                _item->SetChecked(!_item->IsChecked());
-                _list->Draw();
-                break;
-            case KEY_DOWN:
-                _list->Down();
-                break;
-            case KEY_UP:
-                _list->Up();
-                break;
-            case 27:
-                return 0;
-            case '\n':
-                // Only a box that differs from the agent's setting asks it
-                // for anything.
-                if (_item->IsChecked() != enabled) Change(_item->IsChecked());
-                return 1;
-            default:
-                break;
-        }
-    }
+    const auto toggle = [this] {
+        _item->SetChecked(!_item->IsChecked());
+        _list->Draw();
+    };
+    const auto apply = [this]() -> std::optional<int> {
+        // Only a box that differs from the agent's setting asks it for
+        // anything.
+        if (_item->IsChecked() != enabled) Change(_item->IsChecked());
+        return 1;
+    };
+    return RunList(_list, toggle, apply);
 }
 
 // Actions.

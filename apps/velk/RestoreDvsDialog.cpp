@@ -1,11 +1,9 @@
 #include "RestoreDvsDialog.hpp"
 
-#include "ManagementInterface.hpp"
 #include "StringFactory.hpp"
 
 namespace Velk {
 
-using HostCtl::Lib::HostCtlException;
 using HostCtl::Network::ConnectionPoint;
 
 RestoreDvsDialog::RestoreDvsDialog(Frame* parent) : SwitchRestoreDialog(parent, 21, 11) {}
@@ -28,14 +26,6 @@ int RestoreDvsDialog::Run() {
     return moved;
 }
 
-void RestoreDvsDialog::ReadManagementPort() {
-    _mgmtIntf = GetManagementInterface();
-    if (!_mgmtIntf) throw HostCtlException("there is no management interface");
-    const ConnectionPoint point = _mgmtIntf->GetConnectionPoint();
-    if (point.GetType() != ConnectionPoint::DvsPort)
-        throw HostCtlException("the management interface is not on a distributed switch");
-    _dvsName = point.GetSwitchName();
-    _portKey = point.GetName();
-}
+void RestoreDvsDialog::ReadManagementPort() { _portKey = ReadDvsPort().GetName(); }
 
 }  // namespace Velk

@@ -22,8 +22,6 @@ public:
 private:
     void ReadManagementPort();
 
-    std::unique_ptr<HostCtl::Network::QelNic> _mgmtIntf;
-    std::string _dvsName;
     std::string _portKey;
     std::string _newPortKey;
 };

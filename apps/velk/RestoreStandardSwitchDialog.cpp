@@ -2,13 +2,11 @@
 
 #include <algorithm>
 
-#include "ManagementInterface.hpp"
 #include "StringFactory.hpp"
 #include "hostctl/QelCtl.hpp"
 
 namespace Velk {
 
-using HostCtl::Lib::HostCtlException;
 using HostCtl::Network::ConnectionPoint;
 
 namespace {
@@ -55,12 +53,7 @@ int RestoreStandardSwitchDialog::Run() {
 // distributed switch's uplinks; and free names for the switch and its port
 // group.
 void RestoreStandardSwitchDialog::ReadManagementNetwork() {
-    _mgmtIntf = GetManagementInterface();
-    if (!_mgmtIntf) throw HostCtlException("there is no management interface");
-    const ConnectionPoint point = _mgmtIntf->GetConnectionPoint();
-    if (point.GetType() != ConnectionPoint::DvsPort)
-        throw HostCtlException("the management interface is not on a distributed switch");
-    _dvsName = point.GetSwitchName();
+    const ConnectionPoint point = ReadDvsPort();
     HostCtl::Network::DistributedSwitch dvs(_dvsName);
     _vlanId = dvs.GetPortVlanId(point.GetName());
     _uplinks = dvs.GetUsedUplinks();

@@ -32,8 +32,6 @@ private:
     void MoveInterface();
     void DisableOtherInterfaces();
 
-    std::unique_ptr<HostCtl::Network::QelNic> _mgmtIntf;
-    std::string _dvsName;
     uint16_t _vlanId = 0;
     std::vector<std::string> _uplinks;
     std::string _switchName;

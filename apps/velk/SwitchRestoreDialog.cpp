@@ -3,6 +3,7 @@
 #include <syslog.h>
 
 #include "CommandRunner.hpp"
+#include "ManagementInterface.hpp"
 #include "StringFactory.hpp"
 #include "hostctl/Host.hpp"
 
@@ -54,6 +55,17 @@ void SwitchRestoreDialog::Finish(const std::string& logLine, const char* event) 
     Refresh();
     while (GetKey(true) != '\n') {
     }
+}
+
+HostCtl::Network::ConnectionPoint SwitchRestoreDialog::ReadDvsPort() {
+    using HostCtl::Network::ConnectionPoint;
+    _mgmtIntf = GetManagementInterface();
+    if (!_mgmtIntf) throw HostCtl::Lib::HostCtlException("there is no management interface");
+    const ConnectionPoint point = _mgmtIntf->GetConnectionPoint();
+    if (point.GetType() != ConnectionPoint::DvsPort)
+        throw HostCtl::Lib::HostCtlException("the management interface is not on a distributed switch");
+    _dvsName = point.GetSwitchName();
+    return point;
 }
 
 }  // namespace Velk

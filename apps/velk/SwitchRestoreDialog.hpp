@@ -5,10 +5,12 @@
 #pragma once
 
 #include <functional>
+#include <memory>
 #include <string>
 
 #include "Dialog.hpp"
 #include "TextArea.hpp"
+#include "hostctl/HostCtl.hpp"
 
 namespace Velk {
 
@@ -23,6 +25,12 @@ protected:
     bool Step(const std::string& text, const std::function<void()>& work);
     // Logs `logLine` and reports `event`, then waits for Enter.
     void Finish(const std::string& logLine, const char* event);
+    // Finds the management interface and its distributed port (into
+    // `_mgmtIntf` and `_dvsName`); throws when it is on no distributed switch.
+    HostCtl::Network::ConnectionPoint ReadDvsPort();
+
+    std::unique_ptr<HostCtl::Network::QelNic> _mgmtIntf;
+    std::string _dvsName;
 
 private:
     TextArea* _log;  // owned by the window tree
