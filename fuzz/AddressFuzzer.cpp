@@ -38,16 +38,33 @@ bool Throws(const std::string& text) {
     return false;
 }
 
-void CheckIpv4(const std::string& text) {
-    if (!Ipv4Address::IsValidAddress(text)) {
-        Require(Throws<Ipv4Address>(text), "an invalid IPv4 address throws", text);
-        return;
+bool IsValidIp(const std::string& text) {
+    return Ipv6Address::IsValidAddress(text) || Ipv4Address::IsValidAddress(text);
+}
+
+// An address of type T: what parses prints back to text that parses to the
+// same value and prints the same; what does not parse throws HostCtlException
+// only. True when `text` parsed.
+template <typename T>
+bool RoundTrips(const std::string& text, bool (*isValid)(const std::string&), const std::string& kind) {
+    const auto require = [&](bool holds, const std::string& rule) {
+        if (!holds) fuzz_support::Fail(rule.c_str(), text);
+    };
+    if (!isValid(text)) {
+        require(Throws<T>(text), "an invalid " + kind + " throws");
+        return false;
     }
-    const Ipv4Address address(text);
+    const T address(text);
     const std::string printed = address.GetStringAddress();
-    Require(Ipv4Address::IsValidAddress(printed), "a printed IPv4 address parses", text);
-    Require(Ipv4Address(printed) == address, "a printed IPv4 address keeps its value", text);
-    Require(Ipv4Address(printed).GetStringAddress() == printed, "IPv4 printing is stable", text);
+    require(isValid(printed), "a printed " + kind + " parses");
+    require(T(printed) == address, "a printed " + kind + " keeps its value");
+    require(T(printed).GetStringAddress() == printed, kind + " printing is stable");
+    return true;
+}
+
+void CheckIpv4(const std::string& text) {
+    if (!RoundTrips<Ipv4Address>(text, Ipv4Address::IsValidAddress, "IPv4 address")) return;
+    const Ipv4Address address(text);
     Require(Ipv4Address::FromHostOrder(address.GetHostOrder()) == address, "IPv4 host order round trip",
             text);
     // A netmask is a run of ones from the top: one of the 33 prefix masks.
@@ -60,39 +77,19 @@ void CheckIpv4(const std::string& text) {
 }
 
 void CheckIpv6(const std::string& text) {
-    if (!Ipv6Address::IsValidAddress(text)) {
-        Require(Throws<Ipv6Address>(text), "an invalid IPv6 address throws", text);
-    } else {
-        const Ipv6Address address(text);
-        const std::string printed = address.GetStringAddress();
-        Require(Ipv6Address::IsValidAddress(printed), "a printed IPv6 address parses", text);
-        Require(Ipv6Address(printed) == address, "a printed IPv6 address keeps its value", text);
-        Require(Ipv6Address(printed).GetStringAddress() == printed, "IPv6 printing is stable", text);
-    }
+    RoundTrips<Ipv6Address>(text, Ipv6Address::IsValidAddress, "IPv6 address");
     if (!Ipv6Network::IsValidAddressAndNetmask(text)) {
         Require(Throws<Ipv6Network>(text), "an invalid IPv6 network throws", text);
-    } else {
-        const Ipv6Network network(text);
-        Require(network.GetPrefixLength() >= 0 && network.GetPrefixLength() <= 128, "a prefix is 0 to 128",
-                text);
-        const std::string printed = network.ToString();
-        Require(Ipv6Network::IsValidAddressAndNetmask(printed), "a printed IPv6 network parses", text);
-        const Ipv6Network again(printed);
-        Require(again.GetAddress() == network.GetAddress() &&
-                    again.GetPrefixLength() == network.GetPrefixLength(),
-                "a printed IPv6 network keeps its value", text);
-    }
-}
-
-void CheckIp(const std::string& text) {
-    const bool valid = Ipv6Address::IsValidAddress(text) || Ipv4Address::IsValidAddress(text);
-    if (!valid) {
-        Require(Throws<IpAddress>(text), "an invalid IP address throws", text);
         return;
     }
-    const IpAddress address(text);
-    const std::string printed = address.GetStringAddress();
-    Require(IpAddress(printed) == address, "a printed IP address keeps its value", text);
+    const Ipv6Network network(text);
+    Require(network.GetPrefixLength() >= 0 && network.GetPrefixLength() <= 128, "a prefix is 0 to 128", text);
+    const std::string printed = network.ToString();
+    Require(Ipv6Network::IsValidAddressAndNetmask(printed), "a printed IPv6 network parses", text);
+    const Ipv6Network again(printed);
+    Require(
+        again.GetAddress() == network.GetAddress() && again.GetPrefixLength() == network.GetPrefixLength(),
+        "a printed IPv6 network keeps its value", text);
 }
 
 // The VLAN ID rules by value: digits only, 1 to 4094, or 4095 for all VLANs.
@@ -120,18 +117,11 @@ void CheckVlan(const std::string& text) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     if (size > 1024) return 0;
     const std::string input(reinterpret_cast<const char*>(data), size);
-    std::vector<std::string> fields;
-    size_t start = 0;
-    for (;;) {
-        const size_t end = input.find('\n', start);
-        fields.push_back(input.substr(start, end - start));
-        if (end == std::string::npos) break;
-        start = end + 1;
-    }
+    std::vector<std::string> fields = fuzz_support::Split(input, '\n');
     for (const std::string& field : fields) {
         CheckIpv4(field);
         CheckIpv6(field);
-        CheckIp(field);
+        RoundTrips<IpAddress>(field, IsValidIp, "IP address");
         CheckVlan(field);
     }
     fields.resize(std::max<size_t>(fields.size(), 5));

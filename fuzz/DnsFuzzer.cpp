@@ -24,16 +24,10 @@
 
 namespace {
 
+using fuzz_support::FileText;
 using fuzz_support::Require;
 
 std::string g_root;
-
-std::string FileText(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
-}
 
 std::vector<std::string> Lines(const std::string& text) {
     std::vector<std::string> lines;
@@ -76,16 +70,8 @@ void CheckSuffixes(const std::string& line) {
     for (const std::string& piece : pieces) {
         Require(!piece.empty() && piece.find_first_of(" ,\t") == std::string::npos,
                 "a suffix is a non-empty piece without separators", line);
-        std::vector<std::string> labels;
-        size_t start = 0;
-        for (;;) {
-            const size_t dot = piece.find('.', start);
-            labels.push_back(piece.substr(start, dot == std::string::npos ? std::string::npos : dot - start));
-            if (dot == std::string::npos) break;
-            start = dot + 1;
-        }
         bool valid = piece.size() <= 253;
-        for (const std::string& label : labels) valid = valid && IsLabel(label);
+        for (const std::string& label : fuzz_support::Split(piece, '.')) valid = valid && IsLabel(label);
         Require(QelCtl::Network::DnsConfigImpl::IsValidDomainName(piece) == valid,
                 "a domain name is valid exactly when each label is", piece);
     }

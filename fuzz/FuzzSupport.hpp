@@ -1,13 +1,12 @@
-// What the fuzz targets share: a curses screen that writes nowhere, the
-// reading of laid-out mark-up as the text area draws it, and a failure that
-// names the broken rule.
+// What the fuzz targets share: the reading of laid-out mark-up as the text
+// area draws it, small file and text helpers, and a failure that names the
+// broken rule.
 #pragma once
 
-#include <curses.h>
-
-#include <clocale>
 #include <cstdio>
 #include <cstdlib>
+#include <fstream>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -34,22 +33,23 @@ inline void Require(bool holds, const char* rule, std::string_view detail) {
     if (!holds) Fail(rule, detail);
 }
 
-// A vt100-like screen of `lines` x `columns` on /dev/null, in a UTF-8 locale,
-// made once per process.
-inline void EnsureScreen(int lines = 40, int columns = 310) {
-    static const bool ready = [&] {
-        std::setlocale(LC_ALL, "C.UTF-8");
-        unsetenv("LINES");
-        unsetenv("COLUMNS");
-        FILE* out = std::fopen("/dev/null", "w");
-        FILE* in = std::fopen("/dev/null", "r");
-        SCREEN* screen = newterm("vt100", out, in);
-        if (!screen) return false;
-        set_term(screen);
-        resize_term(lines, columns);
-        return true;
-    }();
-    if (!ready) Fail("a curses screen can be made", "newterm(vt100)");
+// Every byte of a file; "" when it cannot be read.
+inline std::string FileText(const std::string& path) {
+    std::ifstream in(path, std::ios::binary);
+    std::ostringstream text;
+    text << in.rdbuf();
+    return text.str();
+}
+
+// `text` cut at every `separator`; empty pieces are kept.
+inline std::vector<std::string> Split(std::string_view text, char separator) {
+    std::vector<std::string> pieces;
+    for (size_t start = 0;;) {
+        const size_t end = text.find(separator, start);
+        pieces.emplace_back(text.substr(start, end == std::string_view::npos ? end : end - start));
+        if (end == std::string_view::npos) return pieces;
+        start = end + 1;
+    }
 }
 
 // The lines of laid-out mark-up as they appear on screen: tags dropped,

@@ -6,12 +6,13 @@
 // "{in}". Rules: no shown line is wider than the area, the shown text is valid
 // UTF-8; drawn, every row holds exactly its laid-out line and nothing outside
 // the area changes. Layout and drawing throw nothing.
-#include <climits>
+#include <algorithm>
 #include <cstdint>
 #include <map>
 #include <string>
 
 #include "Console.hpp"
+#include "FakeTerminal.hpp"
 #include "FuzzSupport.hpp"
 #include "TextArea.hpp"
 #include "Window.hpp"
@@ -26,6 +27,11 @@ const char* const kHostKeys[] = {"ip",         "ssl-thumbprint", "ssh-dsa-finger
                                  "hostname",   "tarnproduct",    "tarnversion",         "memory",
                                  "assettag",   "BIOSversion",    "BMCversion",          "CPLDversion",
                                  "PLSAversion"};
+
+std::string TrimRight(std::string text) {
+    while (!text.empty() && text.back() == ' ') text.pop_back();
+    return text;
+}
 
 std::string WithoutHostKeys(const std::string& text) {
     std::string out;
@@ -49,29 +55,12 @@ std::string WithoutHostKeys(const std::string& text) {
 // covers; trailing blanks dropped.
 std::string DrawnRow(WINDOW* win, int y) {
     std::string row;
-    const int width = getmaxx(win);
-    for (int x = 0; x < width;) {
-        cchar_t cell;
-        wchar_t wide[CCHARW_MAX + 1] = {};
-        attr_t attrs;
-        short pair;
-        std::string text = " ";
-        if (mvwin_wch(win, y, x, &cell) != ERR && getcchar(&cell, wide, &attrs, &pair, nullptr) != ERR) {
-            char bytes[MB_LEN_MAX * (CCHARW_MAX + 1)] = {};
-            const size_t n = std::wcstombs(bytes, wide, sizeof bytes);
-            if (n != static_cast<size_t>(-1)) text.assign(bytes, n);
-        }
+    for (int x = 0; x < getmaxx(win);) {
+        const std::string text = testing_support::CellText(win, y, x);
         row += text;
-        const int columns = Velk::DisplayColumns(text);
-        x += columns > 0 ? columns : 1;
+        x += std::max(1, Velk::DisplayColumns(text));
     }
-    while (!row.empty() && row.back() == ' ') row.pop_back();
-    return row;
-}
-
-std::string TrimRight(std::string text) {
-    while (!text.empty() && text.back() == ' ') text.pop_back();
-    return text;
+    return TrimRight(row);
 }
 
 }  // namespace
@@ -102,8 +91,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     const std::string laidOut = Velk::TextArea::Layout(text, width, lookup);
     fuzz_support::CheckLaidOut(laidOut, width, input);
 
-    // Drawn into an area with a one-cell margin of marked cells around it.
-    fuzz_support::EnsureScreen();
+    // Drawn into an area with a one-cell margin of marked cells around it, on
+    // a screen wide enough for the widest area.
+    testing_support::EnsureFakeTerminal();
+    static const bool sized = resize_term(40, 310) == OK;
+    Require(sized, "a 40x310 curses screen can be made", text);
     const std::string drawn = WithoutHostKeys(text);
     auto* parent = new Velk::Window(0, 0, width + 2, height + 2, Velk::YELLOW, Velk::WHITE);
     WINDOW* outer = parent->GetWindow();

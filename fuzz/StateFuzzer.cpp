@@ -21,6 +21,7 @@
 
 namespace {
 
+using fuzz_support::FileText;
 using fuzz_support::Require;
 using HostCtl::Lib::HostCtlException;
 using HostCtl::Lib::SimState;
@@ -34,13 +35,6 @@ const std::string& Root() {
         return std::string(path);
     }();
     return root;
-}
-
-std::string FileText(const std::string& path) {
-    std::ifstream in(path, std::ios::binary);
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
 }
 
 void WriteFile(const std::string& path, const std::string& text) {

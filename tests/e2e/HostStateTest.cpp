@@ -1,33 +1,19 @@
-// The welcome screen on malformed and extreme host states, each met at the
-// start and swapped in while the console runs (followed by the refresh
-// signal): the console keeps running, or, where it cannot start, ends with one
-// line saying why; the screen stays inside its frame; and the good state,
-// back again, brings back the normal welcome screen.
+// Malformed and extreme host states, each met at the start and swapped in
+// while the console runs (followed by the refresh signal), on the welcome
+// screen and, logged in, on every page of the system customization menu: the
+// console keeps running, or, where it cannot start, ends with one line saying
+// why; the screen stays inside its frame; and the good state, back again,
+// brings back the normal welcome screen.
 #include <signal.h>
 #include <sys/wait.h>
 
 #include "HostStates.hpp"
+#include "LoggedIn.hpp"
 
 namespace E2e {
 namespace {
 
-const char kFooter[] = "Customize System/View Logs";
-
 const char kHeading[] = "Tarni 8.0.2 (QELKernel 8.0.2 Build releasebuild-22380479)";
-
-// The normal welcome screen of the default host, drawn inside its frame. The
-// product heading is read once, at its first use: a console that started on
-// a broken state shows none (`heading` false).
-::testing::AssertionResult NormalWelcome(Terminal& t, bool heading = true) {
-    for (const char* text : {"Acme Server 9", "2 x Acme Processor A9-2400 @ 2.40GHz", "16 GiB Memory",
-                             "http://host1/", "http://192.0.2.100/ (DHCP)", kFooter}) {
-        if (auto shown = t.WaitForText(text); !shown) return shown;
-    }
-    if (heading) {
-        if (auto shown = t.Shows(kHeading); !shown) return shown;
-    }
-    return FrameIntact(t);
-}
 
 // The rows of the screen that hold anything.
 std::vector<std::string> Lines(const Terminal& t) {
@@ -37,15 +23,29 @@ std::vector<std::string> Lines(const Terminal& t) {
     return lines;
 }
 
-class HostStateTest : public ::testing::TestWithParam<HostStateCase> {
+class HostStateTest : public ConsoleTestWithParam<HostStateCase> {
 protected:
-    SimHost host;
+    // The normal welcome screen of the default host, drawn inside its frame.
+    // The product heading is read once, at its first use: a console that
+    // started on a broken state shows none (`heading` false).
+    ::testing::AssertionResult NormalWelcome(bool heading = true) {
+        for (const char* text :
+             {"Acme Server 9", "2 x Acme Processor A9-2400 @ 2.40GHz", "16 GiB Memory", "http://host1/",
+              "http://192.0.2.100/ (DHCP)", "Customize System/View Logs"}) {
+            if (auto shown = t->WaitForText(text); !shown) return shown;
+        }
+        if (heading) {
+            if (auto shown = t->Shows(kHeading); !shown) return shown;
+        }
+        return FrameIntact(*t);
+    }
+
     HostFiles good{host};
 };
 
 TEST_P(HostStateTest, AtStartUp) {
     GetParam().apply(host);
-    std::optional<Terminal> t(std::in_place, host.Console());
+    t.emplace(host.Console());
     // The welcome screen (or the welcome message) starts with its frame.
     WaitForFrame(*t);
     if (t->HasExited()) {
@@ -59,7 +59,7 @@ TEST_P(HostStateTest, AtStartUp) {
         // The good state starts it again.
         good.Restore();
         t.emplace(host.Console());
-        EXPECT_TRUE(NormalWelcome(*t));
+        EXPECT_TRUE(NormalWelcome());
         return;
     }
     EXPECT_TRUE(FrameIntact(*t));
@@ -71,27 +71,85 @@ TEST_P(HostStateTest, AtStartUp) {
 
     good.Restore();
     t->Signal(SIGUSR1);
-    EXPECT_TRUE(NormalWelcome(*t, false));
+    EXPECT_TRUE(NormalWelcome(false));
     EXPECT_FALSE(t->HasExited());
 }
 
 TEST_P(HostStateTest, SwappedIn) {
-    Terminal t(host.Console());
-    ASSERT_TRUE(NormalWelcome(t));
+    t.emplace(host.Console());
+    ASSERT_TRUE(NormalWelcome());
     GetParam().apply(host);
-    t.Signal(SIGUSR1);
-    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
-    ASSERT_FALSE(t.HasExited()) << Terminal::DescribeStatus(t.WaitForExit()) << "\n" << t.Dump();
-    EXPECT_TRUE(FrameIntact(t));
+    t->Signal(SIGUSR1);
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    ASSERT_FALSE(t->HasExited()) << Terminal::DescribeStatus(t->WaitForExit()) << "\n" << t->Dump();
+    EXPECT_TRUE(FrameIntact(*t));
 
     good.Restore();
-    t.Signal(SIGUSR1);
-    EXPECT_TRUE(NormalWelcome(t));
-    EXPECT_FALSE(t.HasExited());
+    t->Signal(SIGUSR1);
+    EXPECT_TRUE(NormalWelcome());
+    EXPECT_FALSE(t->HasExited());
 }
 
-INSTANTIATE_TEST_SUITE_P(States, HostStateTest, ::testing::ValuesIn(HostStates::Cases()),
-                         [](const auto& info) { return std::string(info.param.name); });
+// The menu logs in twice per state: a case of its own, run apart from the
+// quick welcome-screen ones.
+class HostStateMenuTest : public HostStateTest {
+protected:
+    // Walks every entry of the menu (14, by Down from the first one),
+    // checking the frame at each; then logs out. Fails when the console ends
+    // on the way.
+    void WalkMenu(const char* when) {
+        SCOPED_TRACE(when);
+        for (int i = 0; i < 14; ++i) {
+            ASSERT_FALSE(t->HasExited()) << Terminal::DescribeStatus(t->WaitForExit()) << "\n" << t->Dump();
+            EXPECT_TRUE(FrameIntact(*t)) << "entry " << i;
+            t->SendKey("Down");
+            ASSERT_TRUE(t->WaitQuiet());
+        }
+        t->SendKey("Esc");
+        ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+        ASSERT_FALSE(t->HasExited()) << t->Dump();
+    }
+};
+
+TEST_P(HostStateMenuTest, EveryEntryDrawsInsideTheFrame) {
+    // Logged in on the broken host, when the console starts on it at all.
+    GetParam().apply(host);
+    t.emplace(PamConsole(host));
+    if (WaitForFrame(*t)) {
+        ASSERT_TRUE(SubmitLogin(*t, kRootPassword));
+        if (t->WaitForText("System Customization", Duration(3000))) {
+            WalkMenu("logged in on the broken state");
+        } else {
+            std::cout << GetParam().name << ": no menu after the login on the broken state\n" << t->Dump();
+            EXPECT_TRUE(FrameIntact(*t));
+        }
+        if (HasFatalFailure()) return;
+    }
+    good.Restore();
+    if (t->HasExited()) {
+        t.emplace(PamConsole(host));
+    } else {
+        t->Signal(SIGUSR1);
+    }
+    ASSERT_TRUE(NormalWelcome(false));
+
+    // The broken state swapped in under the menu.
+    ASSERT_TRUE(LogInToMenu(*t));
+    GetParam().apply(host);
+    t->Signal(SIGUSR1);
+    ASSERT_TRUE(t->WaitQuiet(Duration(300)));
+    WalkMenu("state swapped in under the menu");
+    if (HasFatalFailure()) return;
+
+    good.Restore();
+    t->Signal(SIGUSR1);
+    EXPECT_TRUE(NormalWelcome(false));
+    EXPECT_FALSE(t->HasExited());
+}
+
+const auto kName = [](const auto& info) { return std::string(info.param.name); };
+INSTANTIATE_TEST_SUITE_P(States, HostStateTest, ::testing::ValuesIn(HostStates::Cases()), kName);
+INSTANTIATE_TEST_SUITE_P(States, HostStateMenuTest, ::testing::ValuesIn(HostStates::Cases()), kName);
 
 }  // namespace
 }  // namespace E2e

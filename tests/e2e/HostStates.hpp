@@ -11,9 +11,9 @@
 #include <map>
 #include <nlohmann/json.hpp>
 #include <string>
+#include <tuple>
 
-#include "SimHost.hpp"
-#include "Terminal.hpp"
+#include "LoggedIn.hpp"
 
 namespace E2e {
 
@@ -53,14 +53,12 @@ namespace HostStates {
 
 using nlohmann::json;
 
-inline json State(const SimHost& host) { return json::parse(host.ReadFile("/host.json")); }
-inline void Write(const SimHost& host, const json& state) { host.WriteFile("/host.json", state.dump(1)); }
 // Changes the state file through `edit`, without any check of the result.
 inline std::function<void(SimHost&)> Edit(std::function<void(json&)> edit) {
     return [edit](SimHost& host) {
-        json state = State(host);
+        json state = json::parse(host.ReadFile("/host.json"));
         edit(state);
-        Write(host, state);
+        host.WriteFile("/host.json", state.dump(1));
     };
 }
 // Replaces a file by `content` as it is, or by a folder when `content` is null.
@@ -241,10 +239,10 @@ inline ::testing::AssertionResult FrameIntact(const Terminal& t) {
             if (text == a) return true;
         return false;
     };
-    if (!is(0, 0, {"┌"})) return failure(0, 0, "┌");
-    if (!is(cols - 1, 0, {"┐"})) return failure(cols - 1, 0, "┐");
-    if (!is(0, rows - 1, {"└"})) return failure(0, rows - 1, "└");
-    if (!is(cols - 1, rows - 1, {"┘"})) return failure(cols - 1, rows - 1, "┘");
+    const std::tuple<int, int, const char*> corners[] = {
+        {0, 0, "┌"}, {cols - 1, 0, "┐"}, {0, rows - 1, "└"}, {cols - 1, rows - 1, "┘"}};
+    for (const auto& [col, row, corner] : corners)
+        if (!is(col, row, {corner})) return failure(col, row, corner);
     // The top line may carry a title between the corners.
     for (int col = 1; col < cols - 1; ++col)
         if (!is(col, rows - 1, {"─", "┴"})) return failure(col, rows - 1, "─");
@@ -255,19 +253,11 @@ inline ::testing::AssertionResult FrameIntact(const Terminal& t) {
     return ::testing::AssertionSuccess();
 }
 
-}  // namespace E2e
-
-namespace E2e {
-
 // Waits until the screen's frame has begun (its top-left corner) or the
-// program has ended, then for quiet. False when neither came.
+// program has ended, then for quiet. Whether the program still runs.
 inline bool WaitForFrame(Terminal& t, Duration timeout = kDefaultTimeout) {
-    const auto end = std::chrono::steady_clock::now() + timeout;
-    while (t.CellAt(0, 0).text != "┌" && !t.HasExited()) {
-        if (std::chrono::steady_clock::now() > end) return false;
-        std::this_thread::sleep_for(Duration(20));
-    }
-    return t.WaitQuiet(Duration(200)) && !t.HasExited();
+    return Eventually([&] { return t.CellAt(0, 0).text == "┌" || t.HasExited(); }, timeout) &&
+           t.WaitQuiet(Duration(200)) && !t.HasExited();
 }
 
 }  // namespace E2e

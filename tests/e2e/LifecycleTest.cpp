@@ -90,24 +90,6 @@ INSTANTIATE_TEST_SUITE_P(
                                   true}),
     [](const auto& info) { return std::string(info.param.name); });
 
-TEST(StartupTest, SecondInstanceLeavesPidFileToFirst) {
-    SimHost host;
-    Terminal first(host.Console());
-    ASSERT_TRUE(WaitForWelcome(first));
-    Terminal second(host.Console("vt100", 80, 24));
-    ASSERT_TRUE(WaitForWelcome(second));
-    EXPECT_EQ(host.ReadFile(kPidFile), std::to_string(first.Pid()));
-    EXPECT_EQ(host.ConsoleLog(kMultiple, second.Pid()).size(), 1u) << Joined(host.SyslogLines());
-    EXPECT_TRUE(host.ConsoleLog(kMultiple, first.Pid()).empty());
-
-    // Once the first has gone, the next start takes the file over.
-    first.Signal(SIGTERM);
-    ASSERT_TRUE(first.ExitsWith(0));
-    Terminal third(host.Console());
-    ASSERT_TRUE(WaitForWelcome(third));
-    EXPECT_EQ(host.ReadFile(kPidFile), std::to_string(third.Pid()));
-}
-
 struct VtCase {
     const char* arg;
     bool valid;

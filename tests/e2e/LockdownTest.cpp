@@ -3,10 +3,6 @@
 // agent for anything, and a refusal of the agent is only logged.
 #include <signal.h>
 
-#include <chrono>
-#include <fstream>
-#include <thread>
-
 #include "LoggedIn.hpp"
 
 namespace E2e {
@@ -41,15 +37,9 @@ protected:
         return t->WaitForText(kItem);
     }
 
-    // Sends keys in the dialog ("Enter", "Esc" by name, others as typed) and
-    // waits until it has closed.
+    // Keys() in the dialog, then waits until it has closed.
     ::testing::AssertionResult Press(const std::vector<std::string>& keys) {
-        for (const std::string& key : keys) {
-            if (key == "Enter" || key == "Esc")
-                t->SendKey(key);
-            else
-                t->Send(key);
-        }
+        Keys(keys);
         if (auto closed = t->WaitForTextGone(kItem); !closed) return closed;
         return WaitForMenu(*t);
     }
@@ -148,20 +138,14 @@ TEST_F(LockdownTest, TerminationDuringAToolEndsTheConsoleAtOnce) {
     ASSERT_TRUE(Open());
     t->Send(" ");
     t->SendKey("Enter");
-    std::vector<std::pair<pid_t, char>> children;
-    for (int i = 0; i < 250 && children.empty(); ++i) {
-        std::this_thread::sleep_for(Duration(20));
-        children = t->Children();
-    }
+    Eventually([&] { return !t->Children().empty(); }, Duration(5000));
+    const auto children = t->Children();
     ASSERT_EQ(children.size(), 1u) << "the tool did not start";
     const auto start = std::chrono::steady_clock::now();
     t->Signal(SIGTERM);
     ASSERT_TRUE(t->ExitsWith(0, Duration(4000)));
     EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(3));
-    EXPECT_EQ(kill(children[0].first, 0) == 0 &&
-                  std::ifstream("/proc/" + std::to_string(children[0].first) + "/cmdline").peek() != EOF,
-              false)
-        << "the tool outlived the console";
+    EXPECT_TRUE(Ended(children[0].first)) << "the tool outlived the console";
     EXPECT_EQ(host.Get("/hostAgent/lockdownEnabled"), false);
 }
 

@@ -1,8 +1,11 @@
 #include "LoggedIn.hpp"
 
 #include <algorithm>
+#include <cctype>
 #include <cstdlib>
-#include <thread>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
 
 namespace E2e {
 
@@ -15,14 +18,13 @@ std::string WithOption(const char* current, const std::string& extra) {
     return value + extra;
 }
 
-template <typename Check>
-::testing::AssertionResult Poll(Check check, Duration timeout) {
-    const auto end = std::chrono::steady_clock::now() + timeout;
-    for (;;) {
-        if (check()) return ::testing::AssertionSuccess();
-        if (std::chrono::steady_clock::now() > end) return ::testing::AssertionFailure();
-        std::this_thread::sleep_for(Duration(20));
-    }
+// The fields of /proc/PID/stat from the state (field 3) on, "" once gone.
+std::string StatFields(pid_t pid) {
+    std::ifstream in("/proc/" + std::to_string(pid) + "/stat");
+    std::string text;
+    std::getline(in, text);
+    const size_t close = text.rfind(')');
+    return close == std::string::npos || close + 2 >= text.size() ? "" : text.substr(close + 2);
 }
 
 }  // namespace
@@ -87,7 +89,7 @@ TerminalOptions PamConsole(const SimHost& host, const std::string& term, int col
         // would otherwise be sent keys for a screen it has not drawn yet.
         const size_t before = t.BytesReceived();
         t.SendKey(up ? "Up" : "Down");
-        Poll([&] { return t.BytesReceived() > before; }, Duration(3000));
+        Eventually([&] { return t.BytesReceived() > before; }, Duration(3000));
         if (auto quiet = t.WaitQuiet(); !quiet) return quiet;
     }
     return ::testing::AssertionFailure() << "\"" << entry << "\" never got selected\n" << t.Dump();
@@ -101,13 +103,15 @@ std::vector<nlohmann::json> History(const SimHost& host, const std::vector<std::
 }
 
 ::testing::AssertionResult WaitForHistory(const SimHost& host, const std::string& tool, Duration timeout) {
-    if (Poll([&] { return !History(host, {tool}).empty(); }, timeout)) return ::testing::AssertionSuccess();
+    if (Eventually([&] { return !History(host, {tool}).empty(); }, timeout))
+        return ::testing::AssertionSuccess();
     return ::testing::AssertionFailure()
            << "no " << tool << " in the history: " << host.Get("/history").dump(1);
 }
 
 ::testing::AssertionResult WaitForLog(const SimHost& host, const std::string& text, Duration timeout) {
-    if (Poll([&] { return !host.ConsoleLog(text).empty(); }, timeout)) return ::testing::AssertionSuccess();
+    if (Eventually([&] { return !host.ConsoleLog(text).empty(); }, timeout))
+        return ::testing::AssertionSuccess();
     return ::testing::AssertionFailure() << "no log line with \"" << text << "\":\n"
                                          << Joined(host.SyslogLines());
 }
@@ -132,6 +136,39 @@ std::string Joined(const std::vector<std::string>& lines) {
     return all;
 }
 
+std::vector<std::string> Operations(const SimHost& host) {
+    std::vector<std::string> operations;
+    for (const auto& e : History(host, {"hostctl"})) operations.push_back(e["operation"]);
+    return operations;
+}
+
+std::vector<pid_t> ChildrenOf(pid_t pid) {
+    std::vector<pid_t> children;
+    std::error_code ec;
+    for (const auto& task :
+         std::filesystem::directory_iterator("/proc/" + std::to_string(pid) + "/task", ec)) {
+        std::ifstream in(task.path() / "children");
+        for (long child; in >> child;) children.push_back(pid_t(child));
+    }
+    return children;
+}
+
+long CpuTicks(pid_t pid) {
+    std::istringstream fields(StatFields(pid));
+    std::string field;
+    long ticks = 0;
+    int n = 3;
+    // utime is field 14, stime 15.
+    for (; n <= 15 && fields >> field; ++n)
+        if (n >= 14) ticks += std::stol(field);
+    return n > 15 ? ticks : -1;
+}
+
+bool Ended(pid_t pid) {
+    const std::string fields = StatFields(pid);
+    return fields.empty() || fields[0] == 'Z';
+}
+
 ::testing::AssertionResult ConsoleTest::Start(const std::string& term) {
     t.emplace(PamConsole(host, term));
     return WaitForWelcome(*t);
@@ -147,6 +184,23 @@ std::string Joined(const std::vector<std::string>& lines) {
     if (auto selected = SelectEntry(*t, entry); !selected) return selected;
     t->SendKey("Enter");
     return t->WaitForText(shown);
+}
+
+void ConsoleTest::Keys(const std::vector<std::string>& keys) {
+    for (const std::string& key : keys) {
+        if (key.size() > 1 && std::isupper(static_cast<unsigned char>(key[0])))
+            t->SendKey(key);
+        else
+            t->Send(key);
+    }
+}
+
+std::vector<std::string> ConsoleTest::Logged(const std::vector<std::string>& texts) const {
+    std::vector<std::string> found;
+    for (const std::string& line : host.ConsoleLog("", t->Pid()))
+        for (const std::string& text : texts)
+            if (line.find(text) != std::string::npos) found.push_back(text);
+    return found;
 }
 
 }  // namespace E2e

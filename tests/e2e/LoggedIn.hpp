@@ -6,6 +6,7 @@
 #include <nlohmann/json.hpp>
 #include <optional>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "SimHost.hpp"
@@ -62,6 +63,27 @@ std::vector<nlohmann::json> History(const SimHost& host, const std::vector<std::
 
 std::string Joined(const std::vector<std::string>& lines);
 
+// The "operation" of every hostctl entry of /history, in order.
+std::vector<std::string> Operations(const SimHost& host);
+
+// Polls `check` every 20 ms until it holds or `timeout` has passed; whether it held.
+template <typename Check>
+bool Eventually(Check check, Duration timeout = kDefaultTimeout) {
+    const auto end = std::chrono::steady_clock::now() + timeout;
+    while (!check()) {
+        if (std::chrono::steady_clock::now() > end) return false;
+        std::this_thread::sleep_for(Duration(20));
+    }
+    return true;
+}
+
+// Any process, read from /proc: the children of all its threads; its utime +
+// stime in clock ticks (-1 once gone); whether it has ended (gone, or a
+// zombie nobody has reaped yet).
+std::vector<pid_t> ChildrenOf(pid_t pid);
+long CpuTicks(pid_t pid);
+bool Ended(pid_t pid);
+
 // A case on a fresh host where root has kRootPassword. `t` is the console
 // once one of the Start functions ran; a case that needs another host changes
 // it before that.
@@ -76,6 +98,12 @@ protected:
     ::testing::AssertionResult StartInMenu(const std::string& term = "linux");
     // StartInMenu, then selects `entry`, presses Enter and waits for `shown`.
     ::testing::AssertionResult OpenEntry(const std::string& entry, const std::string& shown);
+    // Sends each of `keys`: by name when it is longer than one character and
+    // begins with a capital letter ("Down", "Enter"), else as typed.
+    void Keys(const std::vector<std::string>& keys);
+    // The console's log lines holding one of `texts`, as the texts they hold,
+    // in the order they were logged.
+    std::vector<std::string> Logged(const std::vector<std::string>& texts) const;
 
     SimHost host;
     std::optional<Terminal> t;

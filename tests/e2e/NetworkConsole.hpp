@@ -3,8 +3,8 @@
 // what the apply logged.
 #pragma once
 
-#include <cctype>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "LoggedIn.hpp"
@@ -37,15 +37,6 @@ protected:
         return t->WaitForText(shown);
     }
 
-    void Keys(const std::vector<std::string>& keys) {
-        for (const std::string& key : keys) {
-            if (key.size() > 1 && std::isupper(static_cast<unsigned char>(key[0])))
-                t->SendKey(key);
-            else
-                t->Send(key);
-        }
-    }
-
     // Presses Enter in a dialog and waits until `shown` (the dialog's own
     // text) is gone.
     ::testing::AssertionResult Confirm(const std::string& shown) {
@@ -62,54 +53,45 @@ protected:
         return WaitForLog(host, "Network settings changed.");
     }
 
-    // The console's informational and error lines holding one of `texts`,
-    // as the texts they hold, in the order they were logged.
-    std::vector<std::string> Logged(const std::vector<std::string>& texts) const {
-        std::vector<std::string> found;
-        for (const std::string& line : host.ConsoleLog("", t->Pid())) {
-            for (const std::string& text : texts)
-                if (line.find(text) != std::string::npos) found.push_back(text);
-        }
-        return found;
+    // OpenDialog(entry, shown), Keys(keys), then Confirm(shown).
+    ::testing::AssertionResult Edit(const std::string& entry, const std::string& shown,
+                                    const std::vector<std::string>& keys) {
+        if (auto open = OpenDialog(entry, shown); !open) return open;
+        Keys(keys);
+        return Confirm(shown);
     }
 
-    // Static IPv4 in the IPv4 dialog, from the menu of the network window.
+    // Static IPv4 in the IPv4 dialog, from the menu of the network window:
+    // from the first row down to the static choice, mark it, then the fields.
     ::testing::AssertionResult SetStaticIpv4(const std::string& address, const std::string& mask,
                                              const std::string& gateway) {
-        if (auto open = OpenDialog("IPv4 Configuration", "Set static IPv4 address"); !open) return open;
-        // From the first row down to the static choice, mark it, then the fields.
-        Keys({"Down", "Down", " ", "Down", address, "Down", mask, "Down", gateway});
-        return Confirm("Set static IPv4 address");
+        return Edit("IPv4 Configuration", "Set static IPv4 address",
+                    {"Down", "Down", " ", "Down", address, "Down", mask, "Down", gateway});
     }
 
     // Every dialog of the window confirmed with a change: adapters (zonic1
     // added), VLAN 20, static IPv4 and IPv6, DNS servers, a dotted host name
-    // and two suffixes.
+    // and two suffixes. Without DHCP the automatic DNS row cannot be chosen:
+    // the manual one is current and marked.
     ::testing::AssertionResult EditEverything() {
-        if (auto open = OpenDialog("Network Adapters", "Hardware Label (MAC Address)"); !open) return open;
-        Keys({"Down", " "});
-        if (auto ok = Confirm("Hardware Label (MAC Address)"); !ok) return ok;
-
-        if (auto open = OpenDialog("VLAN (optional)", "VLAN ID (1-4094"); !open) return open;
-        Keys({"20"});
-        if (auto ok = Confirm("VLAN ID (1-4094"); !ok) return ok;
-
-        if (auto ok = SetStaticIpv4("198.51.100.10", "255.255.255.0", "198.51.100.1"); !ok) return ok;
-
-        if (auto open = OpenDialog("IPv6 Configuration", "Set static IPv6 address"); !open) return open;
-        Keys({"Down", "Down", "Down", " ", "Down", "2001:db8:20::10/64", "Down", "Down", "Down",
-              "2001:db8:20::1"});
-        if (auto ok = Confirm("Set static IPv6 address"); !ok) return ok;
-
-        // Without DHCP the automatic row cannot be chosen: the manual one is
-        // current and marked.
-        if (auto open = OpenDialog("DNS Configuration", "Use the following DNS server"); !open) return open;
-        Keys({"Down", "198.51.100.53", "Down", "2001:db8:20::53", "Down", "esx7.lab.test"});
-        if (auto ok = Confirm("Use the following DNS server"); !ok) return ok;
-
-        if (auto open = OpenDialog("Custom DNS Suffixes", "Suffixes:"); !open) return open;
-        Keys({"lab.test corp.test"});
-        return Confirm("Suffixes:");
+        const std::tuple<const char*, const char*, std::vector<std::string>> edits[] = {
+            {"Network Adapters", "Hardware Label (MAC Address)", {"Down", " "}},
+            {"VLAN (optional)", "VLAN ID (1-4094", {"20"}},
+            {"IPv4 Configuration",
+             "Set static IPv4 address",
+             {"Down", "Down", " ", "Down", "198.51.100.10", "Down", "255.255.255.0", "Down", "198.51.100.1"}},
+            {"IPv6 Configuration",
+             "Set static IPv6 address",
+             {"Down", "Down", "Down", " ", "Down", "2001:db8:20::10/64", "Down", "Down", "Down",
+              "2001:db8:20::1"}},
+            {"DNS Configuration",
+             "Use the following DNS server",
+             {"Down", "198.51.100.53", "Down", "2001:db8:20::53", "Down", "esx7.lab.test"}},
+            {"Custom DNS Suffixes", "Suffixes:", {"lab.test corp.test"}},
+        };
+        for (const auto& [entry, shown, keys] : edits)
+            if (auto ok = Edit(entry, shown, keys); !ok) return ok << " (" << entry << ")";
+        return ::testing::AssertionSuccess();
     }
 };
 

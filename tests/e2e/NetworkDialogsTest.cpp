@@ -54,9 +54,7 @@ TEST_F(StaticHostTest, ConfirmingEveryDialogUnchangedAsksNothing) {
 
 TEST_F(NetworkTest, EscAtTheQuestionKeepsTheEditsAndNoDropsThem) {
     ASSERT_TRUE(OpenNetwork());
-    ASSERT_TRUE(OpenDialog("VLAN (optional)", "VLAN ID (1-4094"));
-    t->Send("20");
-    ASSERT_TRUE(Confirm("VLAN ID (1-4094"));
+    ASSERT_TRUE(Edit("VLAN (optional)", "VLAN ID (1-4094", {"20"}));
 
     t->SendKey("Esc");
     ASSERT_TRUE(t->WaitForText(kRestartQuestion));
@@ -81,15 +79,13 @@ TEST_F(NetworkTest, EscAtTheQuestionKeepsTheEditsAndNoDropsThem) {
 
 TEST_F(NetworkTest, Ipv6OffAndOnAgainAsksNothing) {
     ASSERT_TRUE(OpenNetwork());
-    ASSERT_TRUE(OpenDialog("IPv6 Configuration", "Disable IPv6 (restart required)"));
-    t->Send(" ");  // row 0: disable
-    ASSERT_TRUE(Confirm("Disable IPv6 (restart required)"));
+    // Row 0: disable.
+    ASSERT_TRUE(Edit("IPv6 Configuration", "Disable IPv6 (restart required)", {" "}));
     ASSERT_TRUE(SelectEntry(*t, "IPv6 Configuration"));
     EXPECT_TRUE(t->Shows("IPv6 is disabled."));
 
-    ASSERT_TRUE(OpenDialog("IPv6 Configuration", "Disable IPv6 (restart required)"));
-    Keys({"Down", " "});  // row 1: dynamic
-    ASSERT_TRUE(Confirm("Disable IPv6 (restart required)"));
+    // Row 1: dynamic.
+    ASSERT_TRUE(Edit("IPv6 Configuration", "Disable IPv6 (restart required)", {"Down", " "}));
     t->SendKey("Esc");
     ASSERT_TRUE(WaitForMenu(*t));
     EXPECT_TRUE(NotLogged(host, "Setting"));
@@ -97,9 +93,7 @@ TEST_F(NetworkTest, Ipv6OffAndOnAgainAsksNothing) {
 
 TEST_F(NetworkTest, Ipv6ChangeAsksForARebootAndTakesEffectAtBoot) {
     ASSERT_TRUE(OpenNetwork());
-    ASSERT_TRUE(OpenDialog("IPv6 Configuration", "Disable IPv6 (restart required)"));
-    t->Send(" ");
-    ASSERT_TRUE(Confirm("Disable IPv6 (restart required)"));
+    ASSERT_TRUE(Edit("IPv6 Configuration", "Disable IPv6 (restart required)", {" "}));
     t->SendKey("Esc");
     ASSERT_TRUE(t->WaitForText(kRebootQuestion));
     t->Send("Y");
@@ -169,14 +163,12 @@ TEST_F(NetworkTest, VlanFieldAndItsLimits) {
     ASSERT_TRUE(t->WaitForTextGone("VLAN ID (1-4094"));
     EXPECT_TRUE(t->Shows("4095"));
 
-    ASSERT_TRUE(OpenDialog("VLAN (optional)", "VLAN ID (1-4094"));
-    Keys({"4094", "Enter"});  // the pre-filled value is replaced; no warning
-    ASSERT_TRUE(t->WaitForTextGone("VLAN ID (1-4094"));
+    // The pre-filled value is replaced; no warning.
+    ASSERT_TRUE(Edit("VLAN (optional)", "VLAN ID (1-4094", {"4094"}));
     EXPECT_TRUE(t->Shows("4094"));
 
-    ASSERT_TRUE(OpenDialog("VLAN (optional)", "VLAN ID (1-4094"));
-    Keys({"Backspace", "Enter"});  // empty: no VLAN
-    ASSERT_TRUE(t->WaitForTextGone("VLAN ID (1-4094"));
+    // Empty: no VLAN.
+    ASSERT_TRUE(Edit("VLAN (optional)", "VLAN ID (1-4094", {"Backspace"}));
     EXPECT_TRUE(t->Shows("Not set"));
     // Back at the value read, but a dialog was confirmed with another value
     // on the way: the question comes.
@@ -205,9 +197,8 @@ TEST_F(NetworkTest, Ipv4FieldsAreCheckedInRowOrder) {
     EXPECT_TRUE(t->Shows("IPv4 Address: 192.0.2.100"));
 
     // With DHCP marked, what is left in the greyed fields is not checked.
-    ASSERT_TRUE(OpenDialog("IPv4 Configuration", "Set static IPv4 address"));
-    Keys({"Down", "Down", " ", "Down", "999.1", "Up", "Up", " ", "Enter"});
-    ASSERT_TRUE(t->WaitForTextGone("Set static IPv4 address"));
+    ASSERT_TRUE(Edit("IPv4 Configuration", "Set static IPv4 address",
+                     {"Down", "Down", " ", "Down", "999.1", "Up", "Up", " "}));
     EXPECT_TRUE(t->Lacks("Invalid IP address"));
 }
 
@@ -229,14 +220,12 @@ TEST_F(NetworkTest, Ipv6StaticEntriesAreChecked) {
     EXPECT_TRUE(t->Shows("Manual"));
 
     // Empty static rows and gateway are accepted.
-    ASSERT_TRUE(OpenDialog("IPv6 Configuration", "Set static IPv6 address"));
-    Keys({"Down", "Down", "Down", "Down", "Backspace", "Down", "Down", "Down", "Backspace", "Enter"});
-    ASSERT_TRUE(t->WaitForTextGone("Set static IPv6 address"));
+    ASSERT_TRUE(Edit("IPv6 Configuration", "Set static IPv6 address",
+                     {"Down", "Down", "Down", "Down", "Backspace", "Down", "Down", "Down", "Backspace"}));
 
     // The dynamic choice skips every check.
-    ASSERT_TRUE(OpenDialog("IPv6 Configuration", "Set static IPv6 address"));
-    Keys({"Down", "Down", "Down", "Down", "nonsense", "Up", "Up", "Up", " ", "Enter"});
-    ASSERT_TRUE(t->WaitForTextGone("Set static IPv6 address"));
+    ASSERT_TRUE(Edit("IPv6 Configuration", "Set static IPv6 address",
+                     {"Down", "Down", "Down", "Down", "nonsense", "Up", "Up", "Up", " "}));
     EXPECT_TRUE(t->Lacks("Invalid"));
     EXPECT_TRUE(t->Shows("Automatic"));
 }
@@ -260,9 +249,8 @@ TEST_F(NetworkTest, DnsServersAreCheckedAndEmptyOnesGiveNone) {
     EXPECT_TRUE(t->Shows("Hostname: new-host"));
 
     // Both rows emptied: no name servers at all.
-    ASSERT_TRUE(OpenDialog("DNS Configuration", "Use the following DNS server"));
-    Keys({"Down", "Down", "Backspace", "Down", "Backspace", "Enter"});
-    ASSERT_TRUE(t->WaitForTextGone("Use the following DNS server"));
+    ASSERT_TRUE(Edit("DNS Configuration", "Use the following DNS server",
+                     {"Down", "Down", "Backspace", "Down", "Backspace"}));
     ASSERT_TRUE(LeaveAndApply());
     EXPECT_EQ(host.Get("/network/dns/servers"), json::array());
     EXPECT_EQ(host.Get("/network/dns/ipv6Servers"), json::array());

@@ -5,7 +5,6 @@
 
 #include <fstream>
 #include <iterator>
-#include <thread>
 
 #include "LoggedIn.hpp"
 
@@ -198,9 +197,7 @@ TEST_F(TestDialogTest, EscDuringAPingEndsTheRunAndNoPingOutlivesTheConsole) {
     EXPECT_FALSE(ProcessesWith({host.Root(), "qelping"}).empty());
     t->Signal(SIGTERM);
     ASSERT_TRUE(t->ExitsWith(0));
-    for (int i = 0; i < 50 && !ProcessesWith({host.Root(), "qelping"}).empty(); ++i)
-        std::this_thread::sleep_for(Duration(100));
-    EXPECT_TRUE(ProcessesWith({host.Root(), "qelping"}).empty());
+    EXPECT_TRUE(Eventually([&] { return ProcessesWith({host.Root(), "qelping"}).empty(); }, Duration(5000)));
 }
 
 TEST_F(TestDialogTest, AnExistingBackupFailsTheResolveAndStaysAsItWas) {

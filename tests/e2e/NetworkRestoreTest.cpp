@@ -32,12 +32,6 @@ protected:
     bool EventReported(const std::string& event) const {
         return host.ReadFile("/var/log/obzd.log").find(event) != std::string::npos;
     }
-
-    std::vector<std::string> Operations() const {
-        std::vector<std::string> calls;
-        for (const json& e : History(host, {"hostctl"})) calls.push_back(e["operation"]);
-        return calls;
-    }
 };
 
 TEST_F(RestoreTest, FactoryRestoreOnAStandardSwitch) {
@@ -63,7 +57,7 @@ TEST_F(RestoreTest, FactoryRestoreOnAStandardSwitch) {
     EXPECT_TRUE(t->Lacks("Powering Off VMs"));
     EXPECT_TRUE(t->Shows("Auto-configuring network. Done.")) << t->Dump();
     EXPECT_TRUE(History(host, {"powerOffVms"}).empty());
-    EXPECT_EQ(Operations(),
+    EXPECT_EQ(Operations(host),
               (std::vector<std::string>{"DisableNetDumper", "ClearNetworkConfig", "AutoConfigNetwork"}));
 
     // The log line and event come after the work.
@@ -74,11 +68,7 @@ TEST_F(RestoreTest, FactoryRestoreOnAStandardSwitch) {
     const std::vector<std::string> order = {"user.info: Clearing Network Config",
                                             "user.info: Auto-Configuring Network",
                                             "user.info: Restoring factory network settings"};
-    std::vector<std::string> logged;
-    for (const std::string& line : host.ConsoleLog("", t->Pid()))
-        for (const std::string& text : order)
-            if (line.find(text) != std::string::npos) logged.push_back(text);
-    EXPECT_EQ(logged, order);
+    EXPECT_EQ(Logged(order), order);
 
     // The factory network: DHCP on VLAN 0 again.
     EXPECT_EQ(host.Get("/network/vnics/0/ipv4/address"), "192.0.2.100");
@@ -124,7 +114,7 @@ TEST_P(RunningVmsTest, WarnedFirstAndLoggedWhatever) {
     if (std::string(c.warningKey) == "Esc") {
         EXPECT_TRUE(powerOff.empty());
         EXPECT_EQ(host.Get("/network/vnics"), before);
-        EXPECT_TRUE(Operations().empty());
+        EXPECT_TRUE(Operations(host).empty());
     } else {
         ASSERT_EQ(powerOff.size(), 1u);
         EXPECT_EQ(powerOff[0]["args"], json::array());  // never "--terminate"

@@ -21,23 +21,20 @@ TEST_F(NetworkTest, StaticAddressThenTheWelcomeScreenShowsIt) {
     EXPECT_EQ(host.Get("/network/vnics/0/ipv4/address"), "192.0.2.100");
 
     ASSERT_TRUE(LeaveAndApply());
-    EXPECT_EQ(
-        Logged({"Setting ipv4 configuration to 192.0.2.10/255.255.255.0 on qk0", "Setting ipv6 configuration",
-                "Setting default gateway to 192.0.2.254", "Setting hostname to host1",
-                "Setting nameservers to 192.0.2.53", "Setting suffixes to example.test",
-                "Network settings changed."}),
-        (std::vector<std::string>{"Setting ipv4 configuration to 192.0.2.10/255.255.255.0 on qk0",
-                                  "Setting ipv6 configuration", "Setting default gateway to 192.0.2.254",
-                                  "Setting hostname to host1", "Setting nameservers to 192.0.2.53",
-                                  "Setting suffixes to example.test", "Network settings changed."}))
-        << Joined(host.SyslogLines());
+    const std::vector<std::string> steps = {"Setting ipv4 configuration to 192.0.2.10/255.255.255.0 on qk0",
+                                            "Setting ipv6 configuration",
+                                            "Setting default gateway to 192.0.2.254",
+                                            "Setting hostname to host1",
+                                            "Setting nameservers to 192.0.2.53",
+                                            "Setting suffixes to example.test",
+                                            "Network settings changed."};
+    EXPECT_EQ(Logged(steps), steps) << Joined(host.SyslogLines());
     // Static and without DHCP there is nothing to renew.
     EXPECT_TRUE(NotLogged(host, "Renew DHCP lease"));
     // A name without a dot is a host name, not a fully qualified one.
-    std::vector<std::string> calls;
-    for (const json& e : History(host, {"hostctl"})) calls.push_back(e["operation"]);
-    EXPECT_NE(std::find(calls.begin(), calls.end(), "SetHostname"), calls.end()) << json(calls).dump();
-    EXPECT_EQ(std::find(calls.begin(), calls.end(), "SetFqdn"), calls.end()) << json(calls).dump();
+    const std::vector<std::string> calls = Operations(host);
+    EXPECT_NE(std::ranges::find(calls, "SetHostname"), calls.end()) << json(calls).dump();
+    EXPECT_EQ(std::ranges::find(calls, "SetFqdn"), calls.end()) << json(calls).dump();
     const json ipv4 = host.Get("/network/vnics/0/ipv4");
     EXPECT_EQ(ipv4["address"], "192.0.2.10");
     EXPECT_EQ(ipv4["netmask"], "255.255.255.0");
@@ -80,9 +77,7 @@ TEST_F(NetworkTest, EveryStepAppliesInItsOrder) {
     EXPECT_TRUE(NotLogged(host, "failed"));
 
     // What the host itself recorded, in order, with the agent's refresh last.
-    std::vector<std::string> calls;
-    for (const json& e : History(host, {"hostctl"})) calls.push_back(e["operation"]);
-    EXPECT_EQ(calls,
+    EXPECT_EQ(Operations(host),
               (std::vector<std::string>{"AddUplinkToTeamingPolicy", "SetPortGroupVlanId", "SetIpv6Enabled",
                                         "SetVnicIpConfig", "SetDefaultGateway", "SetIpv6DefaultGateway",
                                         "SetVnicEnabled", "SetVnicEnabled", "SetFqdn", "RemoveNameServers",
@@ -124,12 +119,8 @@ protected:
     // IPv4 from DHCP on the management port group's VLAN `vlan`.
     ::testing::AssertionResult SwitchToDhcp(const std::string& vlan) {
         if (auto open = OpenNetwork(); !open) return open;
-        if (auto open = OpenDialog("VLAN (optional)", "VLAN ID (1-4094"); !open) return open;
-        Keys({vlan});
-        if (auto ok = Confirm("VLAN ID (1-4094"); !ok) return ok;
-        if (auto open = OpenDialog("IPv4 Configuration", "Set static IPv4 address"); !open) return open;
-        Keys({"Down", " "});
-        if (auto ok = Confirm("Set static IPv4 address"); !ok) return ok;
+        if (auto ok = Edit("VLAN (optional)", "VLAN ID (1-4094", {vlan}); !ok) return ok;
+        if (auto ok = Edit("IPv4 Configuration", "Set static IPv4 address", {"Down", " "}); !ok) return ok;
         if (auto applied = LeaveAndApply(); !applied) return applied;
         if (auto menu = WaitForMenu(*t); !menu) return menu;
         t->SendKey("Esc");
@@ -188,11 +179,10 @@ TEST_P(NetworkFaultTest, FailedStepIsShownAndTheRestGoesOn) {
     ASSERT_TRUE(EditEverything());
     // After the edits: a read that fails when the window opens keeps its
     // entry from being edited at all.
-    if (*c.operation) host.Fail(c.operation, message);
-    if (!*c.operation) {
-        // The network address of its own subnet passes the dialog but not the host.
+    if (*c.operation)
+        host.Fail(c.operation, message);
+    else  // The network address of its own subnet passes the dialog but not the host.
         ASSERT_TRUE(SetStaticIpv4("198.51.100.0", "255.255.255.0", "198.51.100.1"));
-    }
     t->SendKey("Esc");
     ASSERT_TRUE(t->WaitForText(kRestartQuestion));
     t->Send("y");

@@ -18,7 +18,6 @@
 #include <fstream>
 #include <map>
 #include <random>
-#include <sstream>
 
 #include "LoggedIn.hpp"
 
@@ -44,35 +43,20 @@ constexpr int kWarmUpKeys = 150;
 
 const char kWelcomeFooter[] = "Customize System/View Logs";
 
-long EnvNumber(const char* name, long fallback) {
-    const char* value = getenv(name);
-    if (!value || !*value) return fallback;
-    return strtol(value, nullptr, 10);
-}
-
 // Bytes in a readable form for the failure report.
 std::string Printable(std::string_view bytes, size_t most = 80) {
     std::string out;
-    for (size_t i = 0; i < bytes.size() && i < most; ++i) {
-        const auto c = static_cast<unsigned char>(bytes[i]);
-        char buf[8];
-        if (c == 0x1b) {
-            out += "\\e";
-        } else if (c < 0x20 || c >= 0x7f) {
-            snprintf(buf, sizeof buf, "\\x%02x", c);
-            out += buf;
-        } else if (c == '\\') {
-            out += "\\\\";
-        } else {
-            out += char(c);
-        }
+    for (const unsigned char c : bytes.substr(0, most)) {
+        char hex[8];
+        snprintf(hex, sizeof hex, "\\x%02x", c);
+        out += c == 0x1b ? "\\e" : c == '\\' ? "\\\\" : c >= 0x20 && c < 0x7f ? std::string(1, char(c)) : hex;
     }
     if (bytes.size() > most) out += "...(" + std::to_string(bytes.size()) + " bytes)";
     return out;
 }
 
-// What a thread of a process is doing: "running", or the number of the
-// system call it waits in and its first argument.
+// What the main thread of a process is doing: "running", or the number of
+// the system call it waits in and its first argument.
 struct Syscall {
     bool running = false;
     bool gone = false;
@@ -80,46 +64,19 @@ struct Syscall {
     long arg0 = -1;
 };
 
-Syscall ThreadSyscall(pid_t pid, pid_t tid) {
+Syscall MainThreadSyscall(pid_t pid) {
     Syscall s;
-    std::ifstream in("/proc/" + std::to_string(pid) + "/task/" + std::to_string(tid) + "/syscall");
-    std::string first;
+    std::ifstream in("/proc/" + std::to_string(pid) + "/syscall");
+    std::string first, arg;
     if (!(in >> first)) {
         s.gone = true;
-        return s;
-    }
-    if (first == "running") {
+    } else if (first == "running") {
         s.running = true;
-        return s;
+    } else {
+        s.number = strtol(first.c_str(), nullptr, 10);
+        if (in >> arg) s.arg0 = strtol(arg.c_str(), nullptr, 16);
     }
-    s.number = strtol(first.c_str(), nullptr, 10);
-    std::string arg;
-    if (in >> arg) s.arg0 = strtol(arg.c_str(), nullptr, 16);
     return s;
-}
-
-std::vector<pid_t> ChildrenOf(pid_t pid) {
-    std::vector<pid_t> children;
-    std::ifstream in("/proc/" + std::to_string(pid) + "/task/" + std::to_string(pid) + "/children");
-    for (long child; in >> child;) children.push_back(pid_t(child));
-    return children;
-}
-
-// utime + stime of a whole process, in clock ticks.
-long CpuTicks(pid_t pid) {
-    std::ifstream in("/proc/" + std::to_string(pid) + "/stat");
-    std::string all((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
-    const size_t close = all.rfind(')');
-    if (close == std::string::npos) return -1;
-    std::istringstream fields(all.substr(close + 2));
-    std::string field;
-    long utime = 0, stime = 0;
-    // Fields from the state on: state is field 3, utime 14, stime 15.
-    for (int n = 3; n <= 15 && fields >> field; ++n) {
-        if (n == 14) utime = strtol(field.c_str(), nullptr, 10);
-        if (n == 15) stime = strtol(field.c_str(), nullptr, 10);
-    }
-    return utime + stime;
 }
 
 // Whether the main thread of `pid` waits for something that is bound to come:
@@ -127,7 +84,7 @@ long CpuTicks(pid_t pid) {
 // waits on a full pipe or on its own terminal's output, or for a child that
 // does, is stuck. `why` names the call otherwise.
 bool WaitsSanely(pid_t pid, std::string& why, int depth = 0) {
-    const Syscall s = ThreadSyscall(pid, pid);
+    const Syscall s = MainThreadSyscall(pid);
     if (s.gone || s.running) return true;
     switch (s.number) {
         case 0:  // read: of the terminal only
@@ -160,19 +117,15 @@ bool WaitsSanely(pid_t pid, std::string& why, int depth = 0) {
     std::getline(comm, name);
     if (s.number < 0) {
         // In no system call: the thread has ended (the process is on its way
-        // out) or is stopped. Say what its threads do.
+        // out) or is stopped. Say what its threads do: "tid (name) state".
         why = name + "[" + std::to_string(pid) + "] is in no system call; its threads:";
         std::error_code ec;
         for (const auto& task :
              std::filesystem::directory_iterator("/proc/" + std::to_string(pid) + "/task", ec)) {
             std::ifstream stat(task.path() / "stat");
-            std::string all((std::istreambuf_iterator<char>(stat)), std::istreambuf_iterator<char>());
-            const size_t close = all.rfind(')');
-            std::ifstream taskComm(task.path() / "comm");
-            std::string taskName;
-            std::getline(taskComm, taskName);
-            why += " " + task.path().filename().string() + " " + taskName + " state " +
-                   (close == std::string::npos ? std::string("?") : all.substr(close + 2, 1)) + ";";
+            std::string line;
+            std::getline(stat, line);
+            why += " " + line.substr(0, line.find(' ', line.rfind(')') + 2)) + ";";
         }
         return false;
     }
@@ -191,77 +144,47 @@ class KeyStream {
 public:
     explicit KeyStream(uint64_t seed) : _rng(seed) {}
 
-    std::mt19937_64& Rng() { return _rng; }
     bool Chance(double p) { return std::uniform_real_distribution<double>(0, 1)(_rng) < p; }
     size_t Pick(size_t n) { return std::uniform_int_distribution<size_t>(0, n - 1)(_rng); }
 
     Key Next(const std::string& term) {
-        // Weights favour the keys that move through screens, so that the
-        // stream gets deep into the menus.
-        static const std::vector<std::pair<int, int>> kinds = {
-            {0, 40},  // a key of the terminal type (terminfo)
-            {1, 12},  // an escape form of the console's own key table
-            {2, 6},   // lone Esc
-            {3, 12},  // Enter, Space, y, n, q and digits
-            {4, 10},  // printable ASCII
-            {5, 3},   // control byte
-            {6, 3},   // valid UTF-8 beyond ASCII
-            {7, 2},   // invalid UTF-8
-            {8, 1},   // a paste of hundreds of bytes
-            {9, 1},   // ESC R: the console restarts
-        };
-        int total = 0;
-        for (const auto& [kind, weight] : kinds) total += weight;
-        int roll = int(Pick(size_t(total)));
-        int kind = 0;
-        for (const auto& [k, weight] : kinds) {
-            if (roll < weight) {
-                kind = k;
-                break;
-            }
-            roll -= weight;
-        }
-        switch (kind) {
-            case 0:
+        switch (_kinds(_rng)) {
+            case 0:  // a key of the terminal type (terminfo)
                 return TerminfoKey(term);
-            case 1:
+            case 1:  // an escape form of the console's own key table
                 return ConsoleForm();
-            case 2:
+            case 2:  // lone Esc
                 return {"\x1b", "Esc"};
-            case 3: {
+            case 3: {  // Enter, Space, y, n, q and digits
                 static const char* const common[] = {"\r", " ", "y", "n", "Y", "N", "q", "1",
                                                      "2",  "3", "4", "5", "6", "7", "0", "\n"};
-                const std::string bytes = common[Pick(std::size(common))];
-                return {bytes, "\"" + Printable(bytes) + "\""};
+                return Named("", common[Pick(std::size(common))]);
             }
-            case 4: {
-                const std::string bytes(1, char(0x20 + Pick(0x5f)));
-                return {bytes, "\"" + Printable(bytes) + "\""};
-            }
+            case 4:  // printable ASCII
+                return Named("", std::string(1, char(0x20 + Pick(0x5f))));
             case 5: {
                 // Any control byte but Esc (sent on its own above), and DEL.
                 std::string bytes(1, char(Pick(0x20)));
                 if (bytes[0] == 0x1b) bytes[0] = 0x7f;
-                return {bytes, "ctrl " + Printable(bytes)};
+                return Named("ctrl ", bytes);
             }
-            case 6: {
-                const std::string bytes = Utf8Char();
-                return {bytes, "utf-8 " + Printable(bytes)};
-            }
-            case 7: {
-                const std::string bytes = InvalidUtf8();
-                return {bytes, "invalid utf-8 " + Printable(bytes)};
-            }
-            case 8: {
-                const std::string bytes = Paste();
-                return {bytes, "paste " + Printable(bytes, 40)};
-            }
-            default:
+            case 6:  // valid UTF-8 beyond ASCII
+                return Named("utf-8 ", Utf8Char());
+            case 7:
+                return Named("invalid utf-8 ", InvalidUtf8());
+            case 8:  // a paste of hundreds of bytes
+                return Named("paste ", Paste(), 40);
+            default:  // ESC R: the console restarts
                 return {"\x1bR", "\\eR"};
         }
     }
 
 private:
+    // `bytes` named for the report: quoted when `prefix` is empty.
+    static Key Named(const std::string& prefix, const std::string& bytes, size_t most = 80) {
+        return {bytes, prefix.empty() ? "\"" + Printable(bytes) + "\"" : prefix + Printable(bytes, most)};
+    }
+
     Key TerminfoKey(const std::string& term) {
         static const std::vector<std::pair<const char*, const char*>> keys = {
             {"Up", "kcuu1"},     {"Down", "kcud1"},   {"Left", "kcub1"},    {"Right", "kcuf1"},
@@ -333,6 +256,10 @@ private:
     }
 
     std::mt19937_64 _rng;
+    // The kinds of key of Next(). Weights favour the keys that move through
+    // screens, so that the stream gets deep into the menus; lone Esc,
+    // control bytes, UTF-8 (valid and not) and pastes come less often.
+    std::discrete_distribution<int> _kinds{40, 12, 6, 12, 10, 3, 3, 2, 1, 1};
 };
 
 // Screens on which the console rightly waits for nothing but the host to go
@@ -348,9 +275,8 @@ public:
     void Run() {
         const auto end = Clock::now() + _length;
         if (!Start()) return;
-        while (Clock::now() < end) {
+        while (Clock::now() < end)
             if (!Step()) return;
-        }
         // The last console must still be sane and end cleanly.
         if (_t->HasExited()) {
             CheckEnd(_t->WaitForExit(kHangLimit), "the console ended");
@@ -360,9 +286,8 @@ public:
             CheckEnd(_t->WaitForExit(kHangLimit), "SIGTERM at the end of the run");
         }
         _t.reset();
-        if (getenv("VELK_RANDOM_KEYS_VERBOSE")) {
+        if (getenv("VELK_RANDOM_KEYS_VERBOSE"))
             for (const auto& k : _last) std::cout << "  " << k << "\n";
-        }
         std::cout << "seed " << _seed << ": " << _sent << " keys, " << _logins << " logins, " << _starts
                   << " console starts\n";
     }
@@ -536,14 +461,10 @@ private:
 
     static std::string Descriptors(pid_t pid) {
         std::string list;
-        const std::string dir = "/proc/" + std::to_string(pid) + "/fd/";
-        for (int fd = 0; fd < 256; ++fd) {
-            char target[512];
-            const ssize_t n = readlink((dir + std::to_string(fd)).c_str(), target, sizeof target - 1);
-            if (n < 0) continue;
-            target[n] = '\0';
-            list += "  " + std::to_string(fd) + " -> " + target + "\n";
-        }
+        std::error_code ec;
+        for (const auto& fd : std::filesystem::directory_iterator("/proc/" + std::to_string(pid) + "/fd", ec))
+            list += "  " + fd.path().filename().string() + " -> " +
+                    std::filesystem::read_symlink(fd, ec).string() + "\n";
         return list;
     }
 
@@ -604,8 +525,8 @@ TEST_P(RandomKeysTest, ConsoleSurvives) {
         if (seed != kSeeds[0]) GTEST_SKIP() << "VELK_RANDOM_KEYS_SEED runs one seed";
         seed = strtoull(chosen, nullptr, 10);
     }
-    const long seconds = EnvNumber("VELK_RANDOM_KEYS_SECONDS", 25);
-    RandomKeysRun(seed, Duration(seconds * 1000)).Run();
+    const char* seconds = getenv("VELK_RANDOM_KEYS_SECONDS");
+    RandomKeysRun(seed, Duration(1000 * (seconds && *seconds ? strtol(seconds, nullptr, 10) : 25))).Run();
 }
 
 INSTANTIATE_TEST_SUITE_P(RandomKeys, RandomKeysTest, ::testing::ValuesIn(kSeeds),

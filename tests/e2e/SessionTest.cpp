@@ -5,9 +5,6 @@
 #include <signal.h>
 
 #include <cstring>
-#include <fstream>
-#include <sstream>
-#include <thread>
 
 #include "LoggedIn.hpp"
 
@@ -118,20 +115,6 @@ TEST_F(PowerTest, EscLeavesTheShutdownDialogLoggedOut) {
     EXPECT_TRUE(LoggedOnce(host, "User root logged out.", t->Pid()));
 }
 
-// utime + stime of a process, in clock ticks.
-long CpuTicksOf(pid_t pid) {
-    std::ifstream stat("/proc/" + std::to_string(pid) + "/stat");
-    std::string text;
-    std::getline(stat, text);
-    std::istringstream fields(text.substr(text.rfind(')') + 2));
-    std::string field;
-    long ticks = 0;
-    // From the state (field 3) on: utime is field 14, stime 15.
-    for (int n = 3; n <= 15 && fields >> field; ++n)
-        if (n >= 14) ticks += std::stol(field);
-    return ticks;
-}
-
 using ResetTest = ConsoleTest;
 using LogViewerTest = ConsoleTest;
 using KeyboardTest = ConsoleTest;
@@ -170,9 +153,9 @@ TEST_F(ResetTest, F11ResetsThenEnterRestarts) {
 
     // The simulated host does not go down: the console waits for it without
     // burning a processor, and still ends on a termination signal.
-    const long before = CpuTicksOf(t->Pid());
+    const long before = CpuTicks(t->Pid());
     std::this_thread::sleep_for(std::chrono::seconds(1));
-    EXPECT_LT(CpuTicksOf(t->Pid()) - before, sysconf(_SC_CLK_TCK) / 5);
+    EXPECT_LT(CpuTicks(t->Pid()) - before, sysconf(_SC_CLK_TCK) / 5);
     t->Signal(SIGTERM);
     EXPECT_TRUE(t->ExitsWith(0, Duration(3000)));
 }
@@ -200,15 +183,6 @@ TEST_F(LogViewerTest, DigitOpensTheLogInThePagerAndQReturns) {
     EXPECT_TRUE(WaitForWelcome(*t));
 }
 
-// Whether a process has ended (gone, or a zombie nobody has reaped yet).
-bool Ended(pid_t pid) {
-    std::ifstream stat("/proc/" + std::to_string(pid) + "/stat");
-    std::string text;
-    if (!std::getline(stat, text)) return true;
-    const size_t close = text.rfind(')');
-    return close != std::string::npos && close + 2 < text.size() && text[close + 2] == 'Z';
-}
-
 // A termination or resize while the pager runs ends the pager and the console
 // at once, instead of waiting for somebody to leave the pager.
 TEST_F(LogViewerTest, SignalsEndThePagerAndTheConsole) {
@@ -222,8 +196,8 @@ TEST_F(LogViewerTest, SignalsEndThePagerAndTheConsole) {
         ASSERT_EQ(children.size(), 1u);
         t->Signal(sig);
         EXPECT_TRUE(t->ExitsWith(0, Duration(3000))) << strsignal(sig);
-        for (int i = 0; i < 100 && !Ended(children[0].first); ++i) std::this_thread::sleep_for(Duration(20));
-        EXPECT_TRUE(Ended(children[0].first)) << "the pager outlived the console";
+        EXPECT_TRUE(Eventually([&] { return Ended(children[0].first); }, Duration(2000)))
+            << "the pager outlived the console";
         t.reset();
     }
 }

@@ -22,13 +22,14 @@ namespace {
 
 namespace fs = std::filesystem;
 
-struct Output {
-    int status = -1;
-    std::string out, err;
-};
+bool Keep() {
+    const char* keep = getenv("VELK_E2E_KEEP");
+    return keep && *keep && std::strcmp(keep, "0") != 0;
+}
 
-// Runs a program with the test's environment; returns its status and output.
-Output Run(const std::vector<std::string>& args) {
+}  // namespace
+
+ProgramOutput RunProgram(const std::vector<std::string>& args) {
     int outPipe[2], errPipe[2];
     if (pipe2(outPipe, O_CLOEXEC) != 0 || pipe2(errPipe, O_CLOEXEC) != 0)
         throw std::runtime_error(std::string("pipe: ") + strerror(errno));
@@ -45,7 +46,7 @@ Output Run(const std::vector<std::string>& args) {
     posix_spawn_file_actions_destroy(&actions);
     close(outPipe[1]);
     close(errPipe[1]);
-    Output result;
+    ProgramOutput result;
     if (rc != 0) {
         close(outPipe[0]);
         close(errPipe[0]);
@@ -76,13 +77,6 @@ Output Run(const std::vector<std::string>& args) {
     }
     return result;
 }
-
-bool Keep() {
-    const char* keep = getenv("VELK_E2E_KEEP");
-    return keep && *keep && std::strcmp(keep, "0") != 0;
-}
-
-}  // namespace
 
 SimHost::SimHost(const std::string& hostname, const std::string& network) {
     const char* tmp = getenv("TMPDIR");
@@ -132,7 +126,7 @@ void SimHost::PullCard(int slot) { Tool({"card", _root, "pull", "--slot", std::t
 std::string SimHost::Tool(const std::vector<std::string>& args) const {
     std::vector<std::string> argv{VELK_SIMHOST_BIN};
     argv.insert(argv.end(), args.begin(), args.end());
-    Output out = Run(argv);
+    ProgramOutput out = RunProgram(argv);
     if (!WIFEXITED(out.status) || WEXITSTATUS(out.status) != 0) {
         std::string command;
         for (const auto& a : argv) command += (command.empty() ? "" : " ") + a;

@@ -12,6 +12,15 @@
 
 namespace E2e {
 
+// What a program run to its end wrote, and its wait status.
+struct ProgramOutput {
+    int status = -1;
+    std::string out, err;
+};
+// Runs `args` (argv[0] a path) with standard input from /dev/null and the
+// test's environment until it ends.
+ProgramOutput RunProgram(const std::vector<std::string>& args);
+
 class SimHost {
 public:
     // `network`: shapes for velk-simhost create --network ("dvs,ipv6-off"),

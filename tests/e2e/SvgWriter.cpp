@@ -1,6 +1,5 @@
 #include "SvgWriter.hpp"
 
-#include <cstdio>
 #include <sstream>
 #include <utility>
 
@@ -93,35 +92,12 @@ Screenshot Capture(const Terminal& t) {
 Rgb ForegroundOf(const Screenshot& shot, const Cell& cell) { return Resolve(shot, cell).fg; }
 Rgb BackgroundOf(const Screenshot& shot, const Cell& cell) { return Resolve(shot, cell).bg; }
 
-std::string HexColor(const Rgb& rgb) {
-    char text[8];
-    std::snprintf(text, sizeof text, "#%02x%02x%02x", rgb.r, rgb.g, rgb.b);
-    return text;
-}
-
 std::string XmlEscape(std::string_view text) {
+    static const char* const kEntities[] = {"&amp;", "&lt;", "&gt;", "&quot;", "&apos;"};
     std::string out;
-    out.reserve(text.size());
     for (char c : text) {
-        switch (c) {
-            case '&':
-                out += "&amp;";
-                break;
-            case '<':
-                out += "&lt;";
-                break;
-            case '>':
-                out += "&gt;";
-                break;
-            case '"':
-                out += "&quot;";
-                break;
-            case '\'':
-                out += "&apos;";
-                break;
-            default:
-                out += c;
-        }
+        const size_t special = std::string_view("&<>\"'").find(c);
+        out += special == std::string_view::npos ? std::string(1, c) : kEntities[special];
     }
     return out;
 }
@@ -146,7 +122,7 @@ std::string ToSvg(const Screenshot& shot, const SvgOptions& options) {
             int end = col + 1;
             while (end < shot.cols && BackgroundOf(shot, shot.At(end, row)) == bg) ++end;
             svg << "<rect x=\"" << col * cw << "\" y=\"" << row * ch << "\" width=\"" << (end - col) * cw
-                << "\" height=\"" << ch << "\" fill=\"" << HexColor(bg) << "\"/>\n";
+                << "\" height=\"" << ch << "\" fill=\"" << ToString(bg) << "\"/>\n";
             col = end;
         }
         // Text: one element per run of equal foreground and underline, blanks
@@ -182,7 +158,7 @@ std::string ToSvg(const Screenshot& shot, const SvgOptions& options) {
                 }
                 text += cell.text;
             }
-            svg << "<text x=\"" << xs << "\" y=\"" << row * ch + baseline << "\" fill=\"" << HexColor(fg)
+            svg << "<text x=\"" << xs << "\" y=\"" << row * ch + baseline << "\" fill=\"" << ToString(fg)
                 << "\"";
             if (underline) svg << " text-decoration=\"underline\"";
             svg << ">" << XmlEscape(text) << "</text>\n";

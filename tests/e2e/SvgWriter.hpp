@@ -39,9 +39,6 @@ Screenshot Capture(const Terminal& t);
 Rgb ForegroundOf(const Screenshot& shot, const Cell& cell);
 Rgb BackgroundOf(const Screenshot& shot, const Cell& cell);
 
-// "#rrggbb".
-std::string HexColor(const Rgb& rgb);
-
 // Text with the five XML special characters written as entities.
 std::string XmlEscape(std::string_view text);
 

@@ -1,9 +1,6 @@
 // The SVG pictures of the screen: read back cell by cell, they must hold the
 // characters and colours the terminal shows, for made-up cells with known
-// colours and for real screens (the harness's curses probe, the console's
-// welcome screen).
-#include <cstring>
-#include <iterator>
+// colours and for a real screen (the console's welcome screen).
 #include <regex>
 #include <sstream>
 
@@ -22,28 +19,14 @@ struct SvgCell {
     bool underline = false;
 };
 
-std::string Unescape(const std::string& text) {
-    static const std::pair<const char*, char> entities[] = {
-        {"&lt;", '<'}, {"&gt;", '>'}, {"&quot;", '"'}, {"&apos;", '\''}, {"&amp;", '&'}};
-    std::string out;
-    for (size_t i = 0; i < text.size();) {
-        bool replaced = false;
-        for (const auto& [entity, c] : entities) {
-            const size_t n = std::strlen(entity);
-            if (text.compare(i, n, entity) == 0) {
-                out += c;
-                i += n;
-                replaced = true;
-                break;
-            }
-        }
-        if (!replaced) {
-            // A bare "&" makes the document malformed.
-            EXPECT_NE(text[i], '&') << "unescaped & in \"" << text << "\"";
-            out += text[i++];
-        }
-    }
-    return out;
+// Entities back to characters; a bare "&" makes the document malformed.
+std::string Unescape(std::string text) {
+    EXPECT_FALSE(std::regex_search(text, std::regex("&(?!(lt|gt|quot|apos|amp);)")))
+        << "unescaped & in " << text;
+    static const std::pair<const char*, const char*> entities[] = {
+        {"&lt;", "<"}, {"&gt;", ">"}, {"&quot;", "\""}, {"&apos;", "'"}, {"&amp;", "&"}};
+    for (const auto& [entity, c] : entities) text = std::regex_replace(text, std::regex(entity), c);
+    return text;
 }
 
 // UTF-8 text split into code points.
@@ -105,15 +88,6 @@ std::vector<SvgCell> ReadBack(const std::string& svg, int cols, int rows, const 
             }
         }
     }
-    // Every element was understood by the patterns above.
-    const auto count = [&](const std::string& tag) {
-        size_t n = 0;
-        for (size_t at = svg.find(tag); at != std::string::npos; at = svg.find(tag, at + 1)) ++n;
-        return n;
-    };
-    EXPECT_EQ(count("<text"), texts);
-    EXPECT_EQ(count("<rect"), size_t(std::distance(std::sregex_iterator(svg.begin(), svg.end(), rect),
-                                                   std::sregex_iterator())));
     return cells;
 }
 
@@ -128,16 +102,16 @@ std::vector<SvgCell> ReadBack(const std::string& svg, int cols, int rows, const 
             const bool blank = cell.text.empty() || cell.text == " ";
             if (drawn.rects != 1)
                 return ::testing::AssertionFailure() << where << " has " << drawn.rects << " backgrounds";
-            if (drawn.bg != HexColor(BackgroundOf(shot, cell)))
+            if (drawn.bg != ToString(BackgroundOf(shot, cell)))
                 return ::testing::AssertionFailure() << where << " background " << drawn.bg << ", expected "
-                                                     << HexColor(BackgroundOf(shot, cell));
+                                                     << ToString(BackgroundOf(shot, cell));
             if (blank ? !(drawn.text.empty() || drawn.text == " ") : drawn.text != cell.text)
                 return ::testing::AssertionFailure()
                        << where << " reads \"" << drawn.text << "\", expected \"" << cell.text << "\"";
-            if (!blank && drawn.fg != HexColor(ForegroundOf(shot, cell)))
+            if (!blank && drawn.fg != ToString(ForegroundOf(shot, cell)))
                 return ::testing::AssertionFailure()
                        << where << " (\"" << cell.text << "\") foreground " << drawn.fg << ", expected "
-                       << HexColor(ForegroundOf(shot, cell));
+                       << ToString(ForegroundOf(shot, cell));
             if (!blank && drawn.underline != cell.underline)
                 return ::testing::AssertionFailure() << where << " underline differs";
         }
@@ -218,48 +192,6 @@ TEST(SvgWriterTest, RunsShareElements) {
     EXPECT_NE(svg.find(R"(<rect x="40" y="0" width="40" height="20" fill="#00aaaa"/>)"), std::string::npos)
         << svg;
     EXPECT_EQ(ReadBack(svg, 8, 1, {10, 20, 16, ""}).size(), 8u);
-}
-
-// The harness's curses probe: its upper half dark grey (colour 6 redefined
-// to 333/333/333) with light grey text, its lower half yellow (colour 3
-// redefined to 999/800/0) with black text, a box in the default colours.
-TEST(SvgWriterTest, ProbeScreenInItsColours) {
-    TerminalOptions probe;
-    probe.program = CURSES_PROBE_BIN;
-    probe.env = {"LANG=C.UTF-8"};
-    probe.cols = 40;
-    probe.rows = 12;
-    Terminal t(probe);
-    ASSERT_TRUE(t.WaitForText("PROBE READY"));
-    t.Send("x");
-    ASSERT_TRUE(t.WaitForText("KEY x"));
-    const Screenshot shot = Capture(t);
-    const std::vector<SvgCell> cells = ReadBack(ToSvg(shot), shot.cols, shot.rows);
-    ASSERT_TRUE(ShowsEveryCell(shot, cells)) << t.Dump(true);
-
-    auto cell = [&](int col, int row) { return cells[size_t(row) * 40 + size_t(col)]; };
-    for (int row = 1; row < 11; ++row) {
-        SCOPED_TRACE("row " + std::to_string(row));
-        EXPECT_EQ(cell(0, row).bg, "#000000");
-        EXPECT_EQ(cell(0, row).fg, "#aaaaaa");
-        EXPECT_EQ(cell(20, row).bg, row < 6 ? "#545454" : "#fecc00");
-    }
-    std::string ready, key;
-    for (int col = 2; col < 13; ++col) {
-        ready += cell(col, 1).text;
-        if (cell(col, 1).text != " ") {
-            EXPECT_EQ(cell(col, 1).fg, "#aaaaaa");
-        }
-    }
-    for (int col = 2; col < 7; ++col) {
-        key += cell(col, 7).text;
-        if (cell(col, 7).text != " ") {
-            EXPECT_EQ(cell(col, 7).fg, "#000000");
-        }
-    }
-    EXPECT_EQ(ready, "PROBE READY");
-    EXPECT_EQ(key, "KEY x");
-    EXPECT_EQ(cell(0, 0).text, "\u250c");
 }
 
 // The console's welcome screen on a simulated host, in the colours the

@@ -350,14 +350,6 @@ struct termios Terminal::Modes() const {
     return modes;
 }
 
-::testing::AssertionResult Terminal::WaitForText(std::string_view text, Duration timeout) {
-    return WaitFor(text, true, timeout);
-}
-
-::testing::AssertionResult Terminal::WaitForTextGone(std::string_view text, Duration timeout) {
-    return WaitFor(text, false, timeout);
-}
-
 ::testing::AssertionResult Terminal::WaitFor(std::string_view text, bool shown, Duration timeout) {
     const auto deadline = Clock::now() + timeout;
     {
@@ -405,8 +397,6 @@ bool Terminal::Reap(int options) {
     if (r == _pid) _status = st;
     return _status.has_value();
 }
-
-bool Terminal::HasExited() { return Reap(WNOHANG); }
 
 std::optional<int> Terminal::WaitForExit(Duration timeout) {
     const auto deadline = Clock::now() + timeout;
@@ -534,16 +524,11 @@ std::vector<Pos> Terminal::FindLocked(std::string_view text, size_t most) const 
                                          << DumpLocked(false);
 }
 
-::testing::AssertionResult Terminal::Shows(std::string_view text) const {
+::testing::AssertionResult Terminal::OnScreen(std::string_view text, bool shown) const {
     std::lock_guard lock(_mutex);
-    if (!FindLocked(text, 1).empty()) return ::testing::AssertionSuccess();
-    return ::testing::AssertionFailure() << "\"" << text << "\" not on the screen\n" << DumpLocked(false);
-}
-
-::testing::AssertionResult Terminal::Lacks(std::string_view text) const {
-    std::lock_guard lock(_mutex);
-    if (FindLocked(text, 1).empty()) return ::testing::AssertionSuccess();
-    return ::testing::AssertionFailure() << "\"" << text << "\" on the screen\n" << DumpLocked(false);
+    if (FindLocked(text, 1).empty() != shown) return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure() << "\"" << text << (shown ? "\" not" : "\"") << " on the screen\n"
+                                         << DumpLocked(false);
 }
 
 std::optional<Pos> Terminal::Find(std::string_view text) const {
@@ -614,11 +599,6 @@ size_t Terminal::BytesReceived() const {
 std::string Terminal::Output() const {
     std::lock_guard lock(_mutex);
     return _output;
-}
-
-std::string Terminal::OutputSince(size_t from) const {
-    std::lock_guard lock(_mutex);
-    return from < _output.size() ? _output.substr(from) : std::string();
 }
 
 int Terminal::OpenDescriptors() const {

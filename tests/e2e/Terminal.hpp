@@ -37,7 +37,7 @@ struct Rgb {
     uint8_t r = 0, g = 0, b = 0;
     bool operator==(const Rgb&) const = default;
 };
-std::string ToString(const Rgb& rgb);
+std::string ToString(const Rgb& rgb);  // "#rrggbb"
 
 // A cell colour as the program set it: the terminal's default, an index into
 // the palette (SGR 30-37/40-47 or 38;5;n) or a direct RGB colour.
@@ -130,9 +130,13 @@ public:
 
     // --- waiting ---
     // Waits until `text` is on the screen, then for the output to go quiet.
-    ::testing::AssertionResult WaitForText(std::string_view text, Duration timeout = kDefaultTimeout);
+    ::testing::AssertionResult WaitForText(std::string_view text, Duration timeout = kDefaultTimeout) {
+        return WaitFor(text, true, timeout);
+    }
     // Waits until `text` is no longer on the screen, then for quiet.
-    ::testing::AssertionResult WaitForTextGone(std::string_view text, Duration timeout = kDefaultTimeout);
+    ::testing::AssertionResult WaitForTextGone(std::string_view text, Duration timeout = kDefaultTimeout) {
+        return WaitFor(text, false, timeout);
+    }
     // Waits until the program has written nothing for `quiet`, counted from
     // its last output but from no earlier than the call.
     ::testing::AssertionResult WaitQuiet(Duration quiet = kQuiet, Duration timeout = kDefaultTimeout);
@@ -142,7 +146,7 @@ public:
     // Waits for the program to end with exit status `code`.
     ::testing::AssertionResult ExitsWith(int code, Duration timeout = kDefaultTimeout);
     // Whether the program has ended, without waiting.
-    bool HasExited();
+    bool HasExited() { return Reap(WNOHANG); }
     // "exit N", "signal N" or "running".
     static std::string DescribeStatus(std::optional<int> status);
 
@@ -161,8 +165,8 @@ public:
     ::testing::AssertionResult HasTextAt(int col, int row, std::string_view text) const;
     // Whether `text` is on the screen (Shows) or nowhere on it (Lacks); the
     // failure shows the screen.
-    ::testing::AssertionResult Shows(std::string_view text) const;
-    ::testing::AssertionResult Lacks(std::string_view text) const;
+    ::testing::AssertionResult Shows(std::string_view text) const { return OnScreen(text, true); }
+    ::testing::AssertionResult Lacks(std::string_view text) const { return OnScreen(text, false); }
     // The screen with row numbers; with `colors`, lines with the foreground,
     // background and attributes of every cell below each row.
     std::string Dump(bool colors = false) const;
@@ -175,8 +179,6 @@ public:
     // Every byte the program wrote to the terminal so far, as it came (also
     // what libvterm was not shown, such as palette sequences).
     std::string Output() const;
-    // The bytes written from offset `from` of Output() on.
-    std::string OutputSince(size_t from) const;
 
     // --- the program as a process ---
     // Entries of /proc/PID/fd of the program (-1 once it has gone).
@@ -191,6 +193,7 @@ private:
     void ReaderLoop();
     void Feed(const char* data, size_t size);
     ::testing::AssertionResult WaitFor(std::string_view text, bool shown, Duration timeout);
+    ::testing::AssertionResult OnScreen(std::string_view text, bool shown) const;
     // The first `most` places of `text`, row by row.
     std::vector<Pos> FindLocked(std::string_view text, size_t most) const;
     Cell CellLocked(int col, int row) const;

@@ -84,7 +84,7 @@ void PrintTo(const TermCase& c, std::ostream* os) { *os << "TERM=" << c.term; }
 
 class ProbeTest : public ::testing::TestWithParam<TermCase> {};
 
-TEST_P(ProbeTest, ScreenColoursAndPalette) {
+TEST_P(ProbeTest, ScreenKeysAndResize) {
     Terminal t(Probe(GetParam().term));
     ASSERT_TRUE(t.WaitForText("PROBE READY 80x24"));
     EXPECT_EQ(t.Find("PROBE READY"), (Pos{2, 1}));
@@ -111,34 +111,24 @@ TEST_P(ProbeTest, ScreenColoursAndPalette) {
         EXPECT_TRUE(t.PaletteLog().empty());
     }
     EXPECT_GT(t.BytesReceived(), 200u);
-}
 
-TEST_P(ProbeTest, KeysFromTerminfo) {
-    Terminal t(Probe(GetParam().term));
-    ASSERT_TRUE(t.WaitForText("PROBE READY"));
-    struct Key {
-        const char* name;
-        const char* shown;
-    };
-    for (const Key& key : {Key{"F2", "KEY KEY_F(2)"}, Key{"Up", "KEY KEY_UP"}, Key{"Down", "KEY KEY_DOWN"},
-                           Key{"Enter", "KEY ^J"}, Key{"Tab", "KEY ^I"}}) {
-        t.SendKey(key.name);
-        EXPECT_TRUE(t.WaitForText(key.shown)) << key.name;
-    }
-    t.Send("\x1b");  // a lone Esc, after ESCDELAY
-    EXPECT_TRUE(t.WaitForText("KEY ^["));
-    t.Send("q");
-    EXPECT_TRUE(t.ExitsWith(0));
-}
-
-TEST_P(ProbeTest, ResizeReachesTheProgram) {
-    Terminal t(Probe(GetParam().term));
-    ASSERT_TRUE(t.WaitForText("PROBE READY 80x24"));
     t.Resize(100, 31);
     ASSERT_TRUE(t.WaitForText("PROBE READY 100x31"));
     EXPECT_EQ(t.Cols(), 100);
     EXPECT_EQ(t.Rows(), 31);
     EXPECT_EQ(t.CellAt(99, 30).text, "┘") << t.Dump();
+
+    // Keys with the bytes terminfo gives; a lone Esc after ESCDELAY.
+    for (const auto& [key, shown] :
+         {std::pair{"F2", "KEY KEY_F(2)"}, std::pair{"Up", "KEY KEY_UP"}, std::pair{"Down", "KEY KEY_DOWN"},
+          std::pair{"Enter", "KEY ^J"}, std::pair{"Tab", "KEY ^I"}}) {
+        t.SendKey(key);
+        EXPECT_TRUE(t.WaitForText(shown)) << key;
+    }
+    t.Send("\x1b");
+    EXPECT_TRUE(t.WaitForText("KEY ^["));
+    t.Send("q");
+    EXPECT_TRUE(t.ExitsWith(0));
 }
 
 INSTANTIATE_TEST_SUITE_P(Terms, ProbeTest,

@@ -3,9 +3,6 @@
 // fails), the shell and console timeouts with their limits, the restart of
 // the management agents with and without a live core, and the console idle
 // timeout taking effect at once.
-#include <chrono>
-#include <thread>
-
 #include "LoggedIn.hpp"
 
 namespace E2e {
@@ -74,16 +71,9 @@ protected:
         return t->WaitForText(shown);
     }
 
-    // Types into the current field (named keys begin with a capital letter
-    // and are longer than one character) and presses Enter; waits until
-    // `shown` (the dialog's own text) is gone.
+    // Keys(), then Enter; waits until `shown` (the dialog's own text) is gone.
     ::testing::AssertionResult Submit(const std::vector<std::string>& keys, const std::string& shown) {
-        for (const std::string& key : keys) {
-            if (key.size() > 1 && std::isupper(static_cast<unsigned char>(key[0])))
-                t->SendKey(key);
-            else
-                t->Send(key);
-        }
+        Keys(keys);
         t->SendKey("Enter");
         return t->WaitForTextGone(shown);
     }
@@ -388,8 +378,8 @@ TEST_F(TroubleshootingTest, LiveCoreRunsBesideTheRestartWithoutBeingAwaited) {
     EXPECT_EQ(order.back()["tool"], "qelbacktrace");
     EXPECT_EQ(Args(order.back()), (std::vector<std::string>{"-w", "-n", "corad", "-o", "corad-restart%", "-d",
                                                             host.Path("/var/log/")}));
-    for (int i = 0; i < 100 && host.Get("/system/systemAlert") != "Corad core dump completed"; ++i)
-        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+    Eventually([&] { return host.Get("/system/systemAlert") == "Corad core dump completed"; },
+               Duration(5000));
     EXPECT_EQ(host.Get("/system/systemAlert"), "Corad core dump completed");
     EXPECT_TRUE(LoggedOnce(host, "user.info: Executing qelbacktrace -c against corad", t->Pid()));
 

@@ -2,7 +2,6 @@
 // bytes that are not UTF-8, measured and cut as the terminal shows them.
 #include <gtest/gtest.h>
 
-#include <ostream>
 #include <string>
 
 #include "AdaptersDialog.hpp"
@@ -13,49 +12,43 @@
 
 namespace {
 
-const std::string kReplacement = "\uFFFD";
-
-struct WidthCase {
-    const char* name;
-    std::string text;
-    int columns;
-    std::string shown;  // the text as written to the terminal
-    int cutAt;          // a width to cut to
-    std::string cut;    // what fits in it
-};
-
-void PrintTo(const WidthCase& c, std::ostream* os) { *os << c.name; }
-
-class DisplayWidthTest : public ::testing::TestWithParam<WidthCase> {};
-
-TEST_P(DisplayWidthTest, MeasuresShowsAndCuts) {
-    const WidthCase& c = GetParam();
-    EXPECT_EQ(Velk::DisplayColumns(c.text), c.columns);
-    EXPECT_EQ(Velk::ShowableText(c.text), c.shown);
-    EXPECT_EQ(Velk::CutToColumns(c.text, c.cutAt), c.cut);
+TEST(DisplayWidth, MeasuresShowsAndCuts) {
+    const std::string kReplacement = "\uFFFD";
+    struct Case {
+        const char* name;
+        std::string text;
+        int columns;
+        std::string shown;  // the text as written to the terminal
+        int cutAt;          // a width to cut to
+        std::string cut;    // what fits in it
+    };
+    const Case cases[] = {
+        {"Ascii", "host1", 5, "host1", 3, "hos"},
+        {"CjkTakesTwoColumns", "\u4e2d\u6587", 4, "\u4e2d\u6587", 3, "\u4e2d"},
+        {"CjkNeverCutInHalf", "a\u4e2d", 3, "a\u4e2d", 2, "a"},
+        {"KanaAndHangul", "\u30db\uac00", 4, "\u30db\uac00", 4, "\u30db\uac00"},
+        {"CombiningTakesNone", "e\u0301", 1, "e\u0301", 1, "e\u0301"},
+        {"CombiningStaysWithItsBase", "ae\u0301b", 3, "ae\u0301b", 2, "ae\u0301"},
+        {"AccentedLatin", "h\u00e9llo", 5, "h\u00e9llo", 2, "h\u00e9"},
+        {"BlockCharacters", "\u2593\u2588", 2, "\u2593\u2588", 1, "\u2593"},
+        {"InvalidByteIsOneReplacement", "a\xffZ", 3, "a" + kReplacement + "Z", 2, "a" + kReplacement},
+        {"CutSequenceIsReplaced", "a\xe4\xb8", 3, "a" + kReplacement + kReplacement, 10,
+         "a" + kReplacement + kReplacement},
+        {"OverlongFormIsReplaced", "\xc0\xaf", 2, kReplacement + kReplacement, 10,
+         kReplacement + kReplacement},
+        {"SurrogateIsReplaced", "\xed\xa0\x80", 3, kReplacement + kReplacement + kReplacement, 1,
+         kReplacement},
+        {"C1ControlIsReplaced", "\xc2\x9b", 1, kReplacement, 1, kReplacement},
+        {"Empty", "", 0, "", 0, ""},
+        {"NothingFitsInZero", "\u4e2d", 2, "\u4e2d", 0, ""},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.name);
+        EXPECT_EQ(Velk::DisplayColumns(c.text), c.columns);
+        EXPECT_EQ(Velk::ShowableText(c.text), c.shown);
+        EXPECT_EQ(Velk::CutToColumns(c.text, c.cutAt), c.cut);
+    }
 }
-
-const WidthCase kWidthCases[] = {
-    {"Ascii", "host1", 5, "host1", 3, "hos"},
-    {"CjkTakesTwoColumns", "\u4e2d\u6587", 4, "\u4e2d\u6587", 3, "\u4e2d"},
-    {"CjkNeverCutInHalf", "a\u4e2d", 3, "a\u4e2d", 2, "a"},
-    {"KanaAndHangul", "\u30db\uac00", 4, "\u30db\uac00", 4, "\u30db\uac00"},
-    {"CombiningTakesNone", "e\u0301", 1, "e\u0301", 1, "e\u0301"},
-    {"CombiningStaysWithItsBase", "ae\u0301b", 3, "ae\u0301b", 2, "ae\u0301"},
-    {"AccentedLatin", "h\u00e9llo", 5, "h\u00e9llo", 2, "h\u00e9"},
-    {"BlockCharacters", "\u2593\u2588", 2, "\u2593\u2588", 1, "\u2593"},
-    {"InvalidByteIsOneReplacement", "a\xffZ", 3, "a" + kReplacement + "Z", 2, "a" + kReplacement},
-    {"CutSequenceIsReplaced", "a\xe4\xb8", 3, "a" + kReplacement + kReplacement, 10,
-     "a" + kReplacement + kReplacement},
-    {"OverlongFormIsReplaced", "\xc0\xaf", 2, kReplacement + kReplacement, 10, kReplacement + kReplacement},
-    {"SurrogateIsReplaced", "\xed\xa0\x80", 3, kReplacement + kReplacement + kReplacement, 1, kReplacement},
-    {"C1ControlIsReplaced", "\xc2\x9b", 1, kReplacement, 1, kReplacement},
-    {"Empty", "", 0, "", 0, ""},
-    {"NothingFitsInZero", "\u4e2d", 2, "\u4e2d", 0, ""},
-};
-
-INSTANTIATE_TEST_SUITE_P(Texts, DisplayWidthTest, ::testing::ValuesIn(kWidthCases),
-                         [](const ::testing::TestParamInfo<WidthCase>& info) { return info.param.name; });
 
 // Printing into a window stops at its right edge instead of wrapping onto
 // the next row.

@@ -8,7 +8,6 @@
 #include <regex>
 
 #include "TestSupport.hpp"
-#include "hostctl/Backend.hpp"
 
 namespace {
 
@@ -82,7 +81,7 @@ TEST_F(HostTest, SyslogAppendsFacilityAndLevel) {
     EXPECT_FALSE(std::getline(log, line)) << "extra line: " << line;
 }
 
-TEST_F(HostTest, SyslogKeepsErrnoAndFormatsPercentM) {
+TEST_F(HostTest, SyslogKeepsErrnoFormatsPercentMAndLongMessages) {
     HostCtl::Lib::OpenLog("VELK", 0, LOG_USER);
     errno = EACCES;
     Syslog(LOG_ERR, "open failed: %m");
@@ -90,17 +89,14 @@ TEST_F(HostTest, SyslogKeepsErrnoAndFormatsPercentM) {
     errno = ENOENT;
     Syslog(LOG_ERR, "%s with errno(%d): %s", "open", errno, strerror(errno));
     EXPECT_EQ(errno, ENOENT);
+    // A long message is written whole.
+    const std::string big(5000, 'x');
+    Syslog(LOG_INFO, "<%s>", big.c_str());
     const std::string log = Log();
     EXPECT_NE(log.find("user.err: open failed: Permission denied\n"), std::string::npos) << log;
     EXPECT_NE(log.find("user.err: open with errno(2): No such file or directory\n"), std::string::npos)
         << log;
-}
-
-TEST_F(HostTest, LongMessagesAreWrittenWhole) {
-    HostCtl::Lib::OpenLog("VELK", 0, LOG_USER);
-    const std::string big(5000, 'x');
-    Syslog(LOG_INFO, "<%s>", big.c_str());
-    EXPECT_NE(Log().find("user.info: <" + big + ">\n"), std::string::npos);
+    EXPECT_NE(log.find("user.info: <" + big + ">\n"), std::string::npos);
 }
 
 TEST_F(HostTest, SyslogWithoutLogFolderDoesNotFail) {
@@ -118,19 +114,11 @@ TEST_F(HostTest, ConcurrentProcessesNeverInterleaveLines) {
     const std::string padding(300, 'p');
     std::vector<pid_t> children;
     for (int c = 0; c < kChildren; ++c) {
-        pid_t pid = fork();
-        ASSERT_GE(pid, 0);
-        if (pid == 0) {
+        children.push_back(Spawn([&] {
             for (int i = 0; i < kLines; ++i) Syslog(LOG_INFO, "child %d line %d %s", c, i, padding.c_str());
-            _exit(0);
-        }
-        children.push_back(pid);
+        }));
     }
-    for (pid_t pid : children) {
-        int status = 0;
-        ASSERT_EQ(waitpid(pid, &status, 0), pid);
-        ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
-    }
+    for (pid_t pid : children) ExpectExitedCleanly(pid);
     const std::regex line(R"(\S+ VELK\[\d+\]: user\.info: child (\d) line (\d+) p{300})");
     std::istringstream log(Log());
     std::string text;

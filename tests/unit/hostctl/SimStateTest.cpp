@@ -1,18 +1,13 @@
 // The simulated host's state file: changes seen across objects and
 // processes, no lost updates, and clear errors for a broken file.
 #include <sys/wait.h>
-#include <unistd.h>
 
 #include "TestSupport.hpp"
-#include "hostctl/Backend.hpp"
-#include "hostctl/QelCtl.hpp"
 
 namespace {
 
 using namespace HostCtlTest;
-using HostCtl::Lib::HostCtlException;
 using HostCtl::Lib::SimState;
-using nlohmann::json;
 
 class SimStateTest : public ::testing::Test {
 protected:
@@ -46,19 +41,7 @@ TEST_F(SimStateTest, WriteByAnotherProcessIsSeen) {
     for (int i = 0; i < 20; ++i) {
         const std::string alert = i % 2 ? "x" : "y";
         ASSERT_NE(reader.Read()->at("alert"), alert);  // cached before the child writes
-        pid_t pid = fork();
-        ASSERT_GE(pid, 0);
-        if (pid == 0) {
-            try {
-                SetAlert(Root(), alert);
-            } catch (...) {
-                _exit(1);
-            }
-            _exit(0);
-        }
-        int status = 0;
-        ASSERT_EQ(waitpid(pid, &status, 0), pid);
-        ASSERT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0);
+        ExpectExitedCleanly(Spawn([&] { SetAlert(Root(), alert); }));
         ASSERT_EQ(reader.Read()->at("alert"), alert) << "round " << i;
     }
 }
@@ -68,19 +51,12 @@ TEST_F(SimStateTest, ConcurrentProcessesLoseNoUpdate) {
     constexpr int kIncrements = 50;
     std::vector<pid_t> children;
     for (int c = 0; c < kChildren; ++c) {
-        pid_t pid = fork();
-        ASSERT_GE(pid, 0);
-        if (pid == 0) {
-            try {
-                SimState state(Root());
-                for (int i = 0; i < kIncrements; ++i)
-                    state.Update([](json& s) { s["counter"] = s["counter"].get<int>() + 1; });
-            } catch (...) {
-                _exit(1);
-            }
-            _exit(0);
-        }
-        children.push_back(pid);
+        children.push_back(Spawn([&] {
+            SimState state(Root());
+            for (int i = 0; i < kIncrements; ++i)
+                state.Update([](json& s) { s["counter"] = s["counter"].get<int>() + 1; });
+        }));
+        ASSERT_GT(children.back(), 0);
     }
     // Meanwhile every read finds a whole file and a counter that never goes
     // back. Failures are only noted here: the children are always waited for.
@@ -115,11 +91,11 @@ TEST_F(SimStateTest, ConcurrentProcessesLoseNoUpdate) {
 TEST_F(SimStateTest, FailedChangeWritesNothing) {
     const std::string before = ReadFile(StatePath());
     SimState state(Root());
-    EXPECT_THROW(state.Update([](json& s) {
+    const auto refuse = [](json& s) {
         s["alert"] = "changed";
         throw HostCtlException("refused");
-    }),
-                 HostCtlException);
+    };
+    EXPECT_THROW(state.Update(refuse), HostCtlException);
     EXPECT_EQ(ReadFile(StatePath()), before);
     EXPECT_EQ(state.Read()->at("alert"), "a");
 }
@@ -230,68 +206,56 @@ TEST_F(WrongFieldTest, OperationsNameTheFileAndTheField) {
         const char* pointer;
         json value;
         std::function<void()> call;
-        const char* what;
+        const char* problem;  // after "field POINTER "
+    };
+    const auto setDhcp = [] {
+        IpConfig dhcp;
+        dhcp.SetUseDhcp(true);
+        Mgmt().SetIpConfig(dhcp);
+    };
+    const auto getToken = [] {
+        QelCtl::Hardware::SmartCardToken token;
+        QelCtl::Hardware::SmartCardInfoImpl().GetToken({"slot0"}, token);
     };
     const Case cases[] = {
         {"/system/systemAlert", 5, [] { QelCtl::System::SystemInfoImpl().GetSystemAlert(); },
-         "field /system/systemAlert must be a string"},
+         "must be a string"},
         {"/vms/running", "no", [] { QelCtl::Resource::ResourceInfoImpl().HasRunningVirtualMachines(); },
-         "field /vms/running must be a non-negative integer"},
+         "must be a non-negative integer"},
         {"/hardware/memory/totalPages", -1, [] { QelCtl::Hardware::MemoryInfoImpl().GetTotalPages(); },
-         "field /hardware/memory/totalPages must be a non-negative integer"},
+         "must be a non-negative integer"},
         {"/network/dns/servers/0", "300.1.1.1",
-         [] { QelCtl::Network::DnsConfigImpl("defaultTcpipStack").GetNameServers(); },
-         "field /network/dns/servers/0 is not an IPv4 address: \"300.1.1.1\""},
-        {"/network/routing/ipv6Gateway", "fe80::zz",
-         [] { QelCtl::Network::RoutingInfoImpl("defaultTcpipStack").GetIpv6QelKernelDefaultGateway(); },
-         "field /network/routing/ipv6Gateway is not an IPv6 address"},
+         [] { QelCtl::Network::DnsConfigImpl(STACK).GetNameServers(); },
+         "is not an IPv4 address: \"300.1.1.1\""},
+        {"/network/routing/ipv6Gateway", "fe80::zz", [] { Ipv6Gateway(); }, "is not an IPv6 address"},
         {"/network/dns/searchDomains", "example.test",
-         [] { QelCtl::Network::DnsConfigImpl("defaultTcpipStack").GetSearchDomains(); },
-         "field /network/dns/searchDomains must be an array"},
-        {"/network/vnics/0/ipv4/dhcp", "yes",
-         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetIpConfig(); },
-         "field /network/vnics/0/ipv4/dhcp must be true or false"},
-        {"/network/vnics/0/ipv6/addresses/0/type", "slaac",
-         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetIpConfig(); },
-         "field /network/vnics/0/ipv6/addresses/0/type must be"},
-        {"/network/vnics/0/ipv6/addresses/0/prefix", 129,
-         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetIpConfig(); },
-         "field /network/vnics/0/ipv6/addresses/0/prefix must be 0 to 128"},
-        {"/network/vnics/0/ipv4", json::array(),
-         [] {
-             HostCtl::Network::IpConfig dhcp;
-             dhcp.SetUseDhcp(true);
-             QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->SetIpConfig(dhcp);
-         },
-         "field /network/vnics/0/ipv4 must be an object"},
+         [] { QelCtl::Network::DnsConfigImpl(STACK).GetSearchDomains(); }, "must be an array"},
+        {"/network/vnics/0/ipv4/dhcp", "yes", [] { Mgmt().GetIpConfig(); }, "must be true or false"},
+        {"/network/vnics/0/ipv6/addresses/0/type", "slaac", [] { Mgmt().GetIpConfig(); }, "must be"},
+        {"/network/vnics/0/ipv6/addresses/0/prefix", 129, [] { Mgmt().GetIpConfig(); }, "must be 0 to 128"},
+        {"/network/vnics/0/ipv4", json::array(), setDhcp, "must be an object"},
         {"/network/pnics/0/speedMbps", 1.5, [] { QelCtl::Network::NetworkInfoImpl().GetPnics(); },
-         "field /network/pnics/0/speedMbps must be an integer"},
-        {"/version/buildNumber", 4294967296, [] { HostCtl::Lib::GetBackend().GetVersionRecord(); },
-         "field /version/buildNumber is too large"},
+         "must be an integer"},
+        {"/version/buildNumber", 4294967296, [] { GetBackend().GetVersionRecord(); }, "is too large"},
         {"/advancedOptions/~1UserVars~1VelkTimeOut", true,
          [] { QelCtl::Adv::AdvancedOptionImpl().FindOption("/UserVars/VelkTimeOut"); },
-         "field /advancedOptions/~1UserVars~1VelkTimeOut must be an integer or a string"},
-        {"/smartCards/slots/0/token", "card",
-         [] {
-             QelCtl::Hardware::SmartCardToken token;
-             QelCtl::Hardware::SmartCardInfoImpl().GetToken({"slot0"}, token);
-         },
-         "field /smartCards/slots/0/token must be an object"},
-        {"/network/managementInterface", "qk9",
-         [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetConnectionPoint(); },
-         "no virtual NIC named \"qk9\""},
+         "must be an integer or a string"},
+        {"/smartCards/slots/0/token", "card", getToken, "must be an object"},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.pointer);
-        SimState(Root()).Replace(HostCtl::Lib::DefaultHostState());
+        Reset();
         Edit([&](json& s) { s[json::json_pointer(c.pointer)] = c.value; });
         const std::string before = ReadFile(StatePath());
-        ExpectStateError(c.call, StatePath(), c.what);
+        ExpectStateError(c.call, StatePath(), std::string("field ") + c.pointer + " " + c.problem);
         EXPECT_EQ(ReadFile(StatePath()), before);
     }
-}
 
-TEST_F(WrongFieldTest, MissingSectionIsNamed) {
+    Reset();
+    Edit([](json& s) { s["network"]["managementInterface"] = "qk9"; });
+    ExpectStateError(
+        [] { QelCtl::Network::NetworkInfoImpl().GetManagementInterface()->GetConnectionPoint(); },
+        StatePath(), "no virtual NIC named \"qk9\"");
     Edit([](json& s) { s.erase("hardware"); });
     ExpectStateError([] { QelCtl::Hardware::CpuInfoImpl().GetNumCpuPackages(); }, StatePath(),
                      "missing field /hardware/cpu/packages");

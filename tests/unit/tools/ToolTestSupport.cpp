@@ -29,6 +29,13 @@ void WriteFile(const std::string& path, const std::string& text) {
 
 size_t Lines(const std::string& text) { return size_t(std::count(text.begin(), text.end(), '\n')); }
 
+::testing::AssertionResult Fails(const Result& r, const std::string& mentions) {
+    if (r.status == 1 && !r.err.empty() && r.err.find(mentions) != std::string::npos && r.out.empty())
+        return ::testing::AssertionSuccess();
+    return ::testing::AssertionFailure() << "status " << r.status << ", wanted 1 and \"" << mentions
+                                         << "\"\nerr: " << r.err << "\nout: " << r.out;
+}
+
 void HostTest::SetUp() {
     std::filesystem::create_directories(VELK_TEST_TMPDIR);
     std::string tmpl = std::string(VELK_TEST_TMPDIR) + "/host-XXXXXX";

@@ -23,6 +23,9 @@ inline const std::vector<std::string> CONSOLE_ENV = {"PYTHONHOME=/"};
 std::string ReadFile(const std::string& path);
 void WriteFile(const std::string& path, const std::string& text);
 size_t Lines(const std::string& text);
+// Exit status 1, a message on standard error that contains `mentions`, and
+// nothing on standard output.
+::testing::AssertionResult Fails(const Result& r, const std::string& mentions = "");
 
 class HostTest : public ::testing::Test {
 protected:
