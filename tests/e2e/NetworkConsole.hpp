@@ -4,7 +4,7 @@
 #pragma once
 
 #include <string>
-#include <tuple>
+#include <utility>
 #include <vector>
 
 #include "LoggedIn.hpp"
@@ -20,6 +20,21 @@ class NetworkTest : public ConsoleTest {
 protected:
     explicit NetworkTest(const std::string& network = "") : ConsoleTest(network) {}
 
+    // The entries of the window in menu order, each with a text its dialog shows.
+    enum Entry { kAdapters, kVlan, kIpv4, kIpv6, kDns, kSuffixes };
+    struct EntryDialog {
+        const char* entry;
+        const char* shown;
+    };
+    static constexpr EntryDialog kDialogs[] = {
+        {"Network Adapters", "Hardware Label (MAC Address)"},
+        {"VLAN (optional)", "VLAN ID (1-4094"},
+        {"IPv4 Configuration", "Set static IPv4 address"},
+        {"IPv6 Configuration", "Set static IPv6 address"},
+        {"DNS Configuration", "Use the following DNS server"},
+        {"Custom DNS Suffixes", "Suffixes:"},
+    };
+
     // Logs in and opens the network window.
     ::testing::AssertionResult OpenNetwork() {
         if (auto menu = StartInMenu(); !menu) return menu;
@@ -28,20 +43,26 @@ protected:
         return t->WaitForText(kNetworkFooter);
     }
 
-    // In the network window: selects `entry`, presses Enter, waits for `shown`.
-    ::testing::AssertionResult OpenDialog(const std::string& entry, const std::string& shown) {
+    // In the network window: selects `entry`, presses Enter, waits for its dialog.
+    ::testing::AssertionResult OpenDialog(Entry entry) {
         for (int i = 0; i < 6; ++i) t->SendKey("Up");
         if (auto quiet = t->WaitQuiet(); !quiet) return quiet;
-        if (auto selected = SelectEntry(*t, entry); !selected) return selected;
+        if (auto selected = SelectEntry(*t, kDialogs[entry].entry); !selected) return selected;
         t->SendKey("Enter");
-        return t->WaitForText(shown);
+        return t->WaitForText(kDialogs[entry].shown);
     }
 
-    // Presses Enter in a dialog and waits until `shown` (the dialog's own
-    // text) is gone.
-    ::testing::AssertionResult Confirm(const std::string& shown) {
+    // Presses Enter in the dialog of `entry` and waits until it has closed.
+    ::testing::AssertionResult Confirm(Entry entry) {
         t->SendKey("Enter");
-        return t->WaitForTextGone(shown);
+        return t->WaitForTextGone(kDialogs[entry].shown);
+    }
+
+    // OpenDialog(entry), Keys(keys), then Confirm(entry).
+    ::testing::AssertionResult Edit(Entry entry, const std::vector<std::string>& keys) {
+        if (auto open = OpenDialog(entry); !open) return open;
+        Keys(keys);
+        return Confirm(entry) << " (" << kDialogs[entry].entry << ")";
     }
 
     // Esc in the network window, Y to the question, then waits for the end
@@ -53,20 +74,11 @@ protected:
         return WaitForLog(host, "Network settings changed.");
     }
 
-    // OpenDialog(entry, shown), Keys(keys), then Confirm(shown).
-    ::testing::AssertionResult Edit(const std::string& entry, const std::string& shown,
-                                    const std::vector<std::string>& keys) {
-        if (auto open = OpenDialog(entry, shown); !open) return open;
-        Keys(keys);
-        return Confirm(shown);
-    }
-
-    // Static IPv4 in the IPv4 dialog, from the menu of the network window:
-    // from the first row down to the static choice, mark it, then the fields.
-    ::testing::AssertionResult SetStaticIpv4(const std::string& address, const std::string& mask,
-                                             const std::string& gateway) {
-        return Edit("IPv4 Configuration", "Set static IPv4 address",
-                    {"Down", "Down", " ", "Down", address, "Down", mask, "Down", gateway});
+    // Static IPv4 in the IPv4 dialog: from the first row down to the static
+    // choice, mark it, then the fields.
+    static std::vector<std::string> StaticIpv4(const std::string& address, const std::string& mask,
+                                               const std::string& gateway) {
+        return {"Down", "Down", " ", "Down", address, "Down", mask, "Down", gateway};
     }
 
     // Every dialog of the window confirmed with a change: adapters (zonic1
@@ -74,25 +86,25 @@ protected:
     // and two suffixes. Without DHCP the automatic DNS row cannot be chosen:
     // the manual one is current and marked.
     ::testing::AssertionResult EditEverything() {
-        const std::tuple<const char*, const char*, std::vector<std::string>> edits[] = {
-            {"Network Adapters", "Hardware Label (MAC Address)", {"Down", " "}},
-            {"VLAN (optional)", "VLAN ID (1-4094", {"20"}},
-            {"IPv4 Configuration",
-             "Set static IPv4 address",
-             {"Down", "Down", " ", "Down", "198.51.100.10", "Down", "255.255.255.0", "Down", "198.51.100.1"}},
-            {"IPv6 Configuration",
-             "Set static IPv6 address",
+        const std::pair<Entry, std::vector<std::string>> edits[] = {
+            {kAdapters, {"Down", " "}},
+            {kVlan, {"20"}},
+            {kIpv4, StaticIpv4("198.51.100.10", "255.255.255.0", "198.51.100.1")},
+            {kIpv6,
              {"Down", "Down", "Down", " ", "Down", "2001:db8:20::10/64", "Down", "Down", "Down",
               "2001:db8:20::1"}},
-            {"DNS Configuration",
-             "Use the following DNS server",
-             {"Down", "198.51.100.53", "Down", "2001:db8:20::53", "Down", "esx7.lab.test"}},
-            {"Custom DNS Suffixes", "Suffixes:", {"lab.test corp.test"}},
+            {kDns, {"Down", "198.51.100.53", "Down", "2001:db8:20::53", "Down", "esx7.lab.test"}},
+            {kSuffixes, {"lab.test corp.test"}},
         };
-        for (const auto& [entry, shown, keys] : edits)
-            if (auto ok = Edit(entry, shown, keys); !ok) return ok << " (" << entry << ")";
+        for (const auto& [entry, keys] : edits)
+            if (auto ok = Edit(entry, keys); !ok) return ok;
         return ::testing::AssertionSuccess();
     }
+};
+
+class StaticNetworkTest : public NetworkTest {
+protected:
+    StaticNetworkTest() : NetworkTest("static") {}
 };
 
 }  // namespace E2e

@@ -1,8 +1,8 @@
 // Restarting and testing the management network with the real console: the
 // interface taken down and up with its new lease on screen, and the ping and
 // resolver checks answered by the simulated network.
-#include <dirent.h>
-
+#include <algorithm>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 
@@ -16,34 +16,21 @@ using nlohmann::json;
 const char kRestartQuestion[] = "Restart management network now?";
 const char kTestTitle[] = "Test Management Network";
 
-// Processes whose command line holds every one of `parts`.
-std::vector<pid_t> ProcessesWith(const std::vector<std::string>& parts) {
-    std::vector<pid_t> found;
-    DIR* proc = opendir("/proc");
-    if (!proc) return found;
-    while (dirent* e = readdir(proc)) {
-        const pid_t pid = static_cast<pid_t>(atoi(e->d_name));
-        if (pid <= 0) continue;
-        std::ifstream in(std::string("/proc/") + e->d_name + "/cmdline", std::ios::binary);
+// Whether a process runs whose command line holds every one of `parts`.
+bool Running(const std::vector<std::string>& parts) {
+    for (const auto& process : std::filesystem::directory_iterator("/proc")) {
+        std::ifstream in(process.path() / "cmdline", std::ios::binary);
         const std::string cmdline((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
-        bool all = !cmdline.empty();
-        for (const std::string& part : parts) all = all && cmdline.find(part) != std::string::npos;
-        if (all) found.push_back(pid);
+        if (!cmdline.empty() && std::ranges::all_of(parts, [&](const std::string& part) {
+                return cmdline.find(part) != std::string::npos;
+            }))
+            return true;
     }
-    closedir(proc);
-    return found;
+    return false;
 }
 
 class RestartTest : public ConsoleTest {
 protected:
-    ::testing::AssertionResult Restart() {
-        if (auto selected = SelectEntry(*t, "Restart Management Network"); !selected) return selected;
-        t->SendKey("Enter");
-        if (auto asked = t->WaitForText(kRestartQuestion); !asked) return asked;
-        t->SendKey("F11");
-        return t->WaitForText("<Enter> OK");
-    }
-
     std::vector<json> EnableCalls() const {
         std::vector<json> calls;
         for (const json& e : History(host, {"hostctl"}))
@@ -65,34 +52,23 @@ TEST_F(RestartTest, OnlyF11RestartsAndTheNewLeaseIsShown) {
     ASSERT_TRUE(WaitForMenu(*t));
     EXPECT_TRUE(EnableCalls().empty());
 
-    // The DHCP server's pool moves: the restart gives up the old lease and
-    // obtains one from the new pool. VLAN 0 has no IPv6 router: only the
-    // link-local address, which is not listed.
-    host.Set("/network/lan/0/dhcp/first", "192.0.2.150");
-    host.Set("/network/lan/0/dhcp/last", "192.0.2.160");
-    ASSERT_TRUE(Restart());
+    // Moved to VLAN 20, the interface takes a lease from that VLAN's server
+    // when it comes up, and a router there advertises a prefix: that address
+    // is listed, the link-local one is not.
+    host.Set("/network/vswitches/0/portgroups/0/vlan", 20);
+    t->SendKey("Enter");
+    ASSERT_TRUE(t->WaitForText(kRestartQuestion));
+    t->SendKey("F11");
+    ASSERT_TRUE(t->WaitForText("<Enter> OK"));
     EXPECT_TRUE(t->Shows("Stopping management network.")) << t->Dump();
     EXPECT_TRUE(t->Shows("Starting management network."));
-    EXPECT_TRUE(t->Shows("IP address is 192.0.2.150")) << t->Dump();
+    EXPECT_TRUE(t->Shows("IP address is 198.51.100.100")) << t->Dump();
+    EXPECT_TRUE(t->Shows("   2001:db8:20:0:250:56ff:fe01:2")) << t->Dump();
     EXPECT_TRUE(t->Lacks("fe80"));
     EXPECT_EQ(EnableCalls(), (std::vector<json>{json{"qk0", false}, json{"qk0", true}}));
     EXPECT_TRUE(LoggedOnce(host, "user.info: Restarting qk0", t->Pid()));
     EXPECT_TRUE(host.ReadFile("/var/log/obzd.log").find("(obz.user.velk.network.restart)Restarting qk0") !=
                 std::string::npos);
-
-    // On VLAN 20 a router advertises a prefix: that address is listed.
-    t->SendKey("Enter");
-    ASSERT_TRUE(WaitForMenu(*t));
-    host.Set("/network/vswitches/0/portgroups/0/vlan", 20);
-    ASSERT_TRUE(Restart());
-    EXPECT_TRUE(t->Shows("IP address is 198.51.100.100")) << t->Dump();
-    EXPECT_TRUE(t->Shows("   2001:db8:20:0:250:56ff:fe01:2")) << t->Dump();
-    EXPECT_TRUE(t->Lacks("fe80"));
-    t->SendKey("Enter");
-    ASSERT_TRUE(WaitForMenu(*t));
-    t->SendKey("Esc");
-    ASSERT_TRUE(WaitForWelcome(*t));
-    EXPECT_TRUE(t->WaitForText("http://198.51.100.100/ (DHCP)"));
 }
 
 class TestDialogTest : public ConsoleTest {
@@ -111,32 +87,21 @@ protected:
         if (auto shown = t->WaitForText("Testing Management Network"); !shown) return shown;
         return t->WaitForText("<Enter> OK");
     }
-
-    std::vector<json> Pings() const {
-        std::vector<json> args;
-        for (const json& e : History(host, {"qelping"})) args.push_back(e["args"]);
-        return args;
-    }
 };
 
 TEST_F(TestDialogTest, DefaultTargetsAnswerAndTheNameResolves) {
     const std::string hosts = host.ReadFile("/etc/hosts");
     ASSERT_TRUE(OpenTest());
     // The gateway and the name server; no IPv6 gateway or server is set.
-    EXPECT_TRUE(t->Shows("Ping Address #1")) << t->Dump();
-    EXPECT_TRUE(t->Shows("192.0.2.1 ")) << t->Dump();
-    EXPECT_TRUE(t->Shows("192.0.2.53")) << t->Dump();
-    EXPECT_TRUE(t->Shows("host1.example.test")) << t->Dump();
-
     ASSERT_TRUE(RunAndWait());
     EXPECT_TRUE(t->Shows("Pinging address #1 (192.0.2.1).")) << t->Dump();
     EXPECT_TRUE(t->Shows("Pinging address #2 (192.0.2.53)."));
-    EXPECT_TRUE(t->Lacks("Pinging address #3"));
     EXPECT_TRUE(t->Shows("Resolving hostname (host1.example.test)."));
     EXPECT_EQ(t->FindAll("OK.").size(), 3u) << t->Dump();
-    EXPECT_TRUE(t->Lacks("Failed."));
     // The tool got the target where its count option was, then the interface.
-    EXPECT_EQ(Pings(), (std::vector<json>{json{"192.0.2.1", "-I", "qk0"}, json{"192.0.2.53", "-I", "qk0"}}));
+    std::vector<json> pings;
+    for (const json& e : History(host, {"qelping"})) pings.push_back(e["args"]);
+    EXPECT_EQ(pings, (std::vector<json>{json{"192.0.2.1", "-I", "qk0"}, json{"192.0.2.53", "-I", "qk0"}}));
     // The hosts file is back as it was, and no copy is left.
     EXPECT_EQ(host.ReadFile("/etc/hosts"), hosts);
     EXPECT_FALSE(host.Exists("/etc/hosts.backup"));
@@ -194,10 +159,10 @@ TEST_F(TestDialogTest, EscDuringAPingEndsTheRunAndNoPingOutlivesTheConsole) {
     EXPECT_TRUE(t->Shows(kTestTitle));
     EXPECT_EQ(History(host, {"qelping"}).size(), 1u) << host.Get("/history").dump(1);
     // The ping goes on in the background until the console ends.
-    EXPECT_FALSE(ProcessesWith({host.Root(), "qelping"}).empty());
+    EXPECT_TRUE(Running({host.Root(), "qelping"}));
     t->Signal(SIGTERM);
     ASSERT_TRUE(t->ExitsWith(0));
-    EXPECT_TRUE(Eventually([&] { return ProcessesWith({host.Root(), "qelping"}).empty(); }, Duration(5000)));
+    EXPECT_TRUE(Eventually([&] { return !Running({host.Root(), "qelping"}); }, Duration(5000)));
 }
 
 TEST_F(TestDialogTest, AnExistingBackupFailsTheResolveAndStaysAsItWas) {
