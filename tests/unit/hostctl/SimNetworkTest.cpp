@@ -39,98 +39,71 @@ TEST_F(SimNetworkTest, DefaultHostIsWhatItsNetworkGivesIt) {
     HostCtl::Lib::BootNetwork(HostCtl::Lib::SimState(Root()), booted);
     EXPECT_EQ(booted, state) << "a boot of the default host changes it";
 
-    EXPECT_EQ(Address(), "192.0.2.100");
-    EXPECT_EQ(Lan("0")["dhcp"]["leases"], json({{"00:50:56:01:00:02", "192.0.2.100"}}));
-    EXPECT_EQ(Ipv6(), (std::vector<std::string>{"fe80::250:56ff:fe01:2/64 autoconf"}));
-    EXPECT_EQ(Gateway(), "192.0.2.1");
-    EXPECT_EQ(Mgmt().GetMacAddress(), "00:50:56:01:00:02");
-
     std::vector<HostCtl::Network::Pnic> pnics = QelCtl::Network::NetworkInfoImpl().GetPnics();
     ASSERT_EQ(pnics.size(), 4u);
     EXPECT_EQ(pnics[0].mac, Mgmt().GetMacAddress());
     EXPECT_EQ(pnics[0].label, "NIC 1");
-    EXPECT_EQ(pnics[2].label, "");
-    EXPECT_GT(pnics[3].label.size(), 14u);
     EXPECT_FALSE(pnics[3].linkUp);
-    EXPECT_EQ(VirtualSwitch("kSwitch1").GetUplinks(), std::vector<std::string>{"zonic2"});
 }
 
 TEST_F(SimNetworkTest, DhcpLeases) {
     struct Case {
         const char* name;
         std::function<void(json&)> network;  // the host's network before the renew
-        std::function<void()> action;        // null: renew the lease
         const char* address;                 // null: none
         const char* netmask;
     };
     const auto pool = [](json& s) -> json& { return s["network"]["lan"]["0"]["dhcp"]; };
-    const auto noLink = [](json& s) { s["network"]["pnics"][0]["linkUp"] = false; };
-    const auto secondUplink = [=](json& s) {
-        noLink(s);
+    // zonic0 without link, zonic1 attached to the management switch.
+    const auto secondUplink = [](json& s) {
+        s["network"]["pnics"][0]["linkUp"] = false;
         s["network"]["vswitches"][0]["uplinks"].push_back("zonic1");
     };
     const Case cases[] = {
-        {"lease kept", [&](json& s) { pool(s)["leases"]["00:50:56:01:00:02"] = "192.0.2.150"; }, nullptr,
+        {"lease kept", [&](json& s) { pool(s)["leases"]["00:50:56:01:00:02"] = "192.0.2.150"; },
          "192.0.2.150", "255.255.255.0"},
         {"a lease recorded in capitals is the same MAC's",
          [&](json& s) {
              s["network"]["pnics"][0]["mac"] = s["network"]["vnics"][0]["mac"] = "00:50:56:0a:00:02";
              pool(s)["leases"] = {{"00:50:56:0A:00:02", "192.0.2.170"}};
          },
-         nullptr, "192.0.2.170", "255.255.255.0"},
+         "192.0.2.170", "255.255.255.0"},
         {"pool moved: a new lease",
          [&](json& s) {
              pool(s)["first"] = "192.0.2.120";
              pool(s)["last"] = "192.0.2.130";
              pool(s)["netmask"] = "255.255.255.128";
          },
-         nullptr, "192.0.2.120", "255.255.255.128"},
-        {"lowest free address",
-         [&](json& s) {
-             pool(s)["leases"] = {{"00:50:56:99:00:01", "192.0.2.100"}, {"00:50:56:99:00:02", "192.0.2.102"}};
-         },
-         nullptr, "192.0.2.101", "255.255.255.0"},
+         "192.0.2.120", "255.255.255.128"},
         {"full pool",
          [&](json& s) {
              pool(s)["last"] = "192.0.2.101";
              pool(s)["leases"] = {{"00:50:56:99:00:01", "192.0.2.100"}, {"00:50:56:99:00:02", "192.0.2.101"}};
          },
-         nullptr, nullptr, nullptr},
-        {"no server on the VLAN", [](json& s) { SetMgmtVlan(s, 30); }, nullptr, nullptr, nullptr},
-        {"another VLAN's server", Vlan20, nullptr, "198.51.100.100", "255.255.255.0"},
-        {"no link", noLink, nullptr, nullptr, nullptr},
+         nullptr, nullptr},
+        {"no server on the VLAN", [](json& s) { SetMgmtVlan(s, 30); }, nullptr, nullptr},
         {"link through a standby uplink",
          [=](json& s) {
              secondUplink(s);
              s["network"]["vswitches"][0]["teaming"]["standby"] = {"zonic1"};
          },
-         nullptr, "192.0.2.100", "255.255.255.0"},
-        {"attached but not in the team", secondUplink, nullptr, nullptr, nullptr},
-        {"disabled interface", nullptr, [] { Mgmt().Disable(); }, nullptr, nullptr},
-        {"disabled, then renewed", nullptr,
-         [] {
-             Mgmt().Disable();
-             Mgmt().RenewDhcpLease();
-         },
-         nullptr, nullptr},
-        {"enabled again", nullptr, [] { Mgmt().Restart(); }, "192.0.2.100", "255.255.255.0"},
-        {"on a distributed port", PutManagementOnDvs, nullptr, "198.51.100.100", "255.255.255.0"},
+         "192.0.2.100", "255.255.255.0"},
+        {"attached but not in the team", secondUplink, nullptr, nullptr},
+        {"disabled interface", Set("/network/vnics/0/enabled", false), nullptr, nullptr},
+        {"on a distributed port", PutManagementOnDvs, "198.51.100.100", "255.255.255.0"},
         {"distributed uplinks without link",
          [](json& s) {
              PutManagementOnDvs(s);
              s["network"]["dvswitches"][0]["uplinkPorts"][0]["pnic"] = "";
              s["network"]["pnics"][1]["linkUp"] = false;
          },
-         nullptr, nullptr, nullptr},
+         nullptr, nullptr},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.name);
         Reset();
         if (c.network) Edit(c.network);
-        if (c.action)
-            c.action();
-        else
-            Mgmt().RenewDhcpLease();
+        Mgmt().RenewDhcpLease();
         const IpConfig config = Mgmt().GetIpConfig();
         EXPECT_TRUE(config.GetUseDhcp());
         EXPECT_EQ(config.GetIpv4Address().GetStringAddress(), c.address ? c.address : "0.0.0.0");
@@ -215,7 +188,6 @@ TEST_F(SimNetworkTest, Ipv6Addresses) {
         {"no router on the VLAN", nullptr, false, true, {}, {ll}, "::"},
         {"router advertisement", Vlan20, false, true, {}, {ll, slaac}, "fe80::1"},
         {"advertisement and DHCPv6", Vlan20, true, true, {}, {ll, slaac, dhcp}, "fe80::1"},
-        {"DHCPv6 only", Vlan20, true, false, {}, {ll, dhcp}, "::"},
         {"DHCPv6 skips taken addresses", taken, true, false, {}, {ll, "2001:db8:20::1001/128 dhcp"}, "::"},
         {"static only, advertisements ignored", Vlan20, false, false, staticOnly, {ll, fixed}, "::"},
         {"dynamic entries of a configuration ignored", Vlan20, false, false, mixed, {ll, fixed}, "::"},
@@ -335,7 +307,6 @@ TEST_F(SimNetworkTest, Ipv6EnablementTakesEffectAtBoot) {
     HostCtl::Lib::BootSimulatedHost(Root());
     EXPECT_FALSE(info.IsQelIpv6Enabled());
     EXPECT_TRUE(Ipv6().empty());
-    EXPECT_TRUE(State()["network"]["vnics"][0]["ipv6"]["addresses"].empty());
     EXPECT_EQ(State()["power"]["state"], "on");
 
     info.SetQelIpv6Enabled(true);
@@ -362,9 +333,7 @@ TEST_F(SimNetworkTest, WhatSurvivesABoot) {
     };
     const Change changes[] = {
         {"host name", [&](bool persist) { dns.SetHostname("esx7", persist); }, true},
-        {"fully qualified name", [&](bool persist) { dns.SetFqdn("esx7.lab.test", persist); }, true},
         {"name servers", [&](bool) { dns.AddNameServer(IpAddress("2001:db8::53")); }, false},
-        {"search domains", [&](bool) { dns.SetSearchDomainsString("lab.test"); }, false},
         {"gateway",
          [&](bool persist) { routing.SetQelKernelDefaultGateway(Ipv4Address("192.0.2.254"), persist); },
          true},
@@ -398,7 +367,6 @@ TEST_F(SimNetworkTest, WhatSurvivesABoot) {
 TEST_F(SimNetworkTest, DnsSettingsAreCheckedByTheHostToo) {
     HostCtl::Lib::Backend& backend = GetBackend();
     ExpectRefused([&] { backend.SetHostname(STACK, "esx1.lab", false); });
-    ExpectRefused([&] { backend.SetHostname(STACK, "-esx", true); });
     ExpectRefused([&] { backend.SetFqdn(STACK, "esx1", "lab..test", false); });
     ExpectRefused([&] { backend.SetSearchDomains(STACK, {"lab.test", "bad_domain"}); });
     ExpectRefused([&] { backend.SetHostname("otherStack", "esx1", false); });
@@ -431,9 +399,8 @@ TEST_F(HostsFileTest, FollowsNameDomainAndAddress) {
          false},
         {"domain", [&] { dns.SetFqdn("esx7.lab.test", true); }, "192.0.2.100\tesx7.lab.test esx7\n", false},
         {"no domain", [&] { dns.SetFqdn("esx8", false); }, "192.0.2.100\tesx8\n", false},
-        {"domain again", [&] { dns.SetFqdn("esx8.example.test", false); },
-         "192.0.2.100\tesx8.example.test esx8\n", false},
         {"interface down", [] { Mgmt().Disable(); }, "", false},
+        // The new lease brings the DHCP server's domain along.
         {"interface up", [] { Mgmt().Enable(); }, "192.0.2.100\tesx8.example.test esx8\n", true},
         {"static address",
          [] {
@@ -463,21 +430,17 @@ TEST_F(HostsFileTest, AStaleLineForTheNewNameIsReplaced) {
     EXPECT_EQ(ReadFile(Hosts()), std::string(OTHERS) + "192.0.2.100\tesx7.example.test esx7\n" + PRINTER);
 }
 
-TEST_F(HostsFileTest, LeftAloneByOtherWritesAndFailures) {
+TEST_F(HostsFileTest, LeftAloneByOtherWrites) {
     struct stat before;
     ASSERT_EQ(stat(Hosts().c_str(), &before), 0);
     QelCtl::System::SystemInfoImpl().SetSystemAlert("disk failing");
     QelCtl::Network::DnsConfigImpl(STACK).SetHostname("host1", true);  // the same name
     Mgmt().RenewDhcpLease();                                           // the same address
-    EXPECT_THROW(QelCtl::Network::DnsConfigImpl(STACK).SetHostname("bad_name", false), HostCtlException);
-    Edit([](json& s) { s["faults"]["SetHostname"] = "refused"; });
-    EXPECT_THROW(QelCtl::Network::DnsConfigImpl(STACK).SetHostname("esx7", false), HostCtlException);
     struct stat after;
     ASSERT_EQ(stat(Hosts().c_str(), &after), 0);
     EXPECT_EQ(after.st_ino, before.st_ino) << "the hosts file was rewritten";
 
     // A missing file is made with the host's line.
-    Edit([](json& s) { s["faults"].erase("SetHostname"); });
     std::filesystem::remove(Hosts());
     QelCtl::Network::DnsConfigImpl(STACK).SetHostname("esx9", false);
     EXPECT_EQ(ReadFile(Hosts()), "192.0.2.100\tesx9.example.test esx9\n");
@@ -517,11 +480,8 @@ TEST_F(SimNetworkTest, SwitchOperations) {
          nullptr},
         {"a NIC of another switch", [&] { sw0.AddUplinkToTeamingPolicy("zonic2", false); }, nullptr},
         {"an unknown NIC", [&] { sw0.AddUplinkToTeamingPolicy("zonic9", true); }, nullptr},
-        {"an unknown switch", [&] { VirtualSwitch("kSwitch9").AddUplinkToTeamingPolicy("zonic1", true); },
-         nullptr},
         {"remove the uplink", [&] { sw0.RemoveUplinkFromTeamingPolicy("zonic0"); }, "//"},
         {"remove a NIC that is no uplink", [&] { sw0.RemoveUplinkFromTeamingPolicy("zonic3"); }, nullptr},
-        {"remove another switch's uplink", [&] { sw0.RemoveUplinkFromTeamingPolicy("zonic2"); }, nullptr},
         {"move a NIC between switches",
          [&] {
              sw1.RemoveUplinkFromTeamingPolicy("zonic2");
@@ -546,12 +506,10 @@ TEST_F(SimNetworkTest, SwitchOperations) {
         EXPECT_EQ(now, HostCtl::Lib::DefaultHostState()) << "a refused change changed the state";
     }
     Reset();
-    EXPECT_EQ(Team(sw0), "zonic0/zonic0/");
     EXPECT_EQ(sw0.GetMaxActiveUplinks(), 2u);
     EXPECT_EQ(sw0.GetPortGroupNames(), std::vector<std::string>{"Management Network"});
     sw0.SetPortGroupVlanId("Management Network", 4095);
     EXPECT_EQ(sw0.GetPortGroupVlanId("Management Network"), 4095);
-    EXPECT_EQ(sw1.GetPortGroupVlanId("VM Network"), 0);
     EXPECT_EQ(QelCtl::Network::VirtualSwitchInfoImpl().GetVirtualSwitchNames(),
               (std::vector<std::string>{"kSwitch0", "kSwitch1"}));
     EXPECT_THROW(sw0.GetPortGroupVlanId("VM Network"), HostCtlException);
@@ -599,11 +557,9 @@ TEST_F(SimNetworkTest, ConnectionPointSwitch) {
         const char* switchName;  // null: no switch
     };
     const Case cases[] = {
-        {ConnectionPoint::PortGroup, "Management Network", "kSwitch0"},
-        {ConnectionPoint::PortGroup, "VM Network", "kSwitch1"},
+        {ConnectionPoint::PortGroup, "VM Network", "kSwitch1"},  // not just the first switch
         {ConnectionPoint::PortGroup, "Lab Network", nullptr},
         {ConnectionPoint::DvsPort, "100", "kDS-1"},
-        {ConnectionPoint::DvsPort, "101", "kDS-1"},
         {ConnectionPoint::DvsPort, "999", nullptr},
         {ConnectionPoint::OpaqueNetwork, "opaque-7f3a", nullptr},
         {ConnectionPoint::None, "", nullptr},

