@@ -63,17 +63,21 @@ TEST(NetworkDialogRules, KeyFiltersTakeTheirCharactersAndTheEditingKeysOnly) {
 TEST(NetworkDialogRules, VlanText) {
     using E = VlanDialog::Entry;
     const std::pair<const char*, E> cases[] = {
-        {"", E::Unset},        {"0", E::Invalid},      {"00000", E::Invalid},
-        {"1", E::Accepted},    {"00007", E::Accepted}, {"4094", E::Accepted},
-        {"4095", E::AllVlans}, {"04095", E::AllVlans}, {"4096", E::Invalid},
-        {"65536", E::Invalid}, {"99999", E::Invalid},  {"18446744073709551617", E::Invalid},
-        {"-1", E::Invalid},    {"+5", E::Invalid},     {" 5", E::Invalid},
-        {"5 ", E::Invalid},    {"12a", E::Invalid},
+        {"", E::Unset},         {"0", E::Invalid},
+        {"1", E::Accepted},     {"00007", E::Accepted},
+        {"4094", E::Accepted},  {"4095", E::AllVlans},
+        {"04095", E::AllVlans}, {"4096", E::Invalid},
+        {"65536", E::Invalid},  {"18446744073709551617", E::Invalid},
+        {"-1", E::Invalid},     {"+5", E::Invalid},
+        {" 5", E::Invalid},     {"5 ", E::Invalid},
+        {"12a", E::Invalid},
     };
     for (const auto& [text, entry] : cases)
         EXPECT_EQ(VlanDialog::CheckText(text), entry) << '"' << text << '"';
 }
 
+// (Which texts are addresses, netmasks or link-local is AddressTest's, in the
+// host library's tests.)
 TEST(NetworkDialogRules, StaticIpv4RefusesTheFirstBadRow) {
     struct Case {
         const char* name;
@@ -85,13 +89,8 @@ TEST(NetworkDialogRules, StaticIpv4RefusesTheFirstBadRow) {
         {"GatewayOutsideTheSubnet", "192.168.1.20", "255.255.255.0", "10.0.0.1", ""},
         {"ZeroGateway", "192.168.1.20", "255.255.0.0", "0.0.0.0", ""},
         {"ShortAddress", "192.168.1", "255.255.255.0", "192.168.1.1", "row 3: 82/83"},
-        {"OctetAbove255", "192.168.1.256", "255.255.255.0", "192.168.1.1", "row 3: 82/83"},
-        {"EmptyAddress", "", "255.255.255.0", "192.168.1.1", "row 3: 82/83"},
         {"NonContiguousMask", "192.168.1.20", "255.255.0.255", "192.168.1.1", "row 4: 86/87"},
-        {"MaskNotAnAddress", "192.168.1.20", "255.255.255", "192.168.1.1", "row 4: 86/87"},
-        {"EmptyMask", "192.168.1.20", "", "192.168.1.1", "row 4: 86/87"},
         {"BadGateway", "192.168.1.20", "255.255.255.0", "192.168..1", "row 5: 90/91"},
-        {"EmptyGateway", "192.168.1.20", "255.255.255.0", "", "row 5: 90/91"},
         {"AddressBeforeMask", "1.2.3", "255.0.255.0", "x", "row 3: 82/83"},
         {"MaskBeforeGateway", "10.1.2.3", "255.0.255.0", "", "row 4: 86/87"},
     };
@@ -116,7 +115,6 @@ TEST(NetworkDialogRules, Ipv6SpaceOnARow) {
     };
     const Case cases[] = {
         {"DisableKeepsTheSwitches", kDhcp, 0, kOffWithDhcp},
-        {"DisableFromStatic", kStatic, 0, kOff},
         {"DynamicFromStaticIsRouterAdvertisement", kStatic, 1, kAdvertised},
         {"DynamicFromOffWithoutDhcp", kOff, 1, kAdvertised},
         {"DynamicFromOffRemembersDhcp", kOffWithDhcp, 1, kDhcp},
@@ -128,7 +126,6 @@ TEST(NetworkDialogRules, Ipv6SpaceOnARow) {
         {"StaticFromDhcp", kDhcp, 3, kStatic},
         {"StaticFromOff", kOffWithDhcp, 3, kStatic},
         {"AddressRowChangesNothing", kDhcp, 4, kDhcp},
-        {"GatewayRowChangesNothing", kOff, 7, kOff},
     };
     for (const Case& c : cases)
         EXPECT_EQ(bits(IPv6ConfigurationDialog::Mark(c.before, c.row)), bits(c.after)) << c.name;
@@ -148,17 +145,12 @@ TEST(NetworkDialogRules, StaticIpv6RefusesTheFirstBadRow) {
          {"2001:db8::10/64", "2001:db8:1::1/48", "fd00::5/128"},
          "2001:db8::1",
          ""},
-        {"SiteLocalIsNotLinkLocal", {"fec0::1/64", "", ""}, "", ""},
         {"LinkLocalGatewayPasses", {"", "", ""}, "fe80::1", ""},
         {"NoPrefix", {"2001:db8::10", "", ""}, "", "row 4: 82/84"},
-        {"PrefixAbove128", {"2001:db8::10/129", "", ""}, "", "row 4: 82/84"},
-        {"NotAnAddress", {"2001:db8:::10/64", "", ""}, "", "row 4: 82/84"},
         {"LinkLocal", {"fe80::10/64", "", ""}, "", "row 4: 88/89"},
-        {"UpperEndOfLinkLocal", {"febf::1/64", "", ""}, "", "row 4: 88/89"},
         {"SecondRow", {"2001:db8::10/64", "2001:db8::11", ""}, "", "row 5: 82/84"},
         {"EmptyRowsSkipped", {"", "", "fe80::1/64"}, "", "row 6: 88/89"},
         {"BadGateway", {"2001:db8::10/64", "", ""}, "2001:db8::1/64", "row 7: 90/92"},
-        {"IPv4Gateway", {"", "", ""}, "192.168.1.1", "row 7: 90/92"},
         {"AddressesBeforeGateway", {"", "x/64", ""}, "zz", "row 5: 82/84"},
     };
     for (const Case& c : cases)

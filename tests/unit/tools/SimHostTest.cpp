@@ -1,7 +1,4 @@
 // velk-simhost: creating a host root, and reading and changing its state.
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <filesystem>
 #include <regex>
 #include <sstream>
@@ -17,13 +14,6 @@ using nlohmann::json;
 using SimHostCreate = HostTest;
 using SimHostState = HostTest;
 
-std::vector<std::string> Words(const std::string& text) {
-    std::istringstream in(text);
-    std::vector<std::string> words;
-    for (std::string w; in >> w;) words.push_back(w);
-    return words;
-}
-
 TEST_F(SimHostCreate, MakesEveryFile) {
     std::error_code ec;
     for (const char* data : {"/host.json", "/etc/zolva/ssl/rui.crt", "/etc/ssh/ssh_host_rsa_key",
@@ -33,19 +23,9 @@ TEST_F(SimHostCreate, MakesEveryFile) {
         EXPECT_TRUE(fs::is_regular_file(_root + data) && fs::file_size(_root + data, ec) > 0) << data;
     const std::string flag = _root + "/var/run/zolva/show-velk-login";
     EXPECT_TRUE(fs::is_regular_file(flag) && fs::file_size(flag, ec) == 0);
-    EXPECT_TRUE(fs::is_directory(_root + "/var/run"));
     EXPECT_TRUE(fs::is_directory(_root + "/dev") && fs::is_empty(_root + "/dev", ec));
-    for (const char* script :
-         {"/bin/hrm-cmd", "/sbin/grabCIMData", "/bin/powerOffVms", "/sbin/powerOffVms", "/bin/openssl"}) {
-        EXPECT_EQ(access((_root + script).c_str(), X_OK), 0) << script;
-        EXPECT_EQ(ReadFile(_root + script).rfind("#!/bin/sh\n", 0), 0u) << script;
-    }
-    for (const auto& [link, target] :
-         {std::pair{"/usr/lib/zolva/openssh/bin/ssh-keygen", "/usr/bin/ssh-keygen"},
-          std::pair{"/bin/less", "/usr/bin/less"}, std::pair{"/bin/sh", "/bin/sh"}}) {
-        EXPECT_TRUE(fs::is_symlink(_root + link)) << link;
-        EXPECT_EQ(fs::read_symlink(_root + link, ec).string(), target);
-    }
+    // (The tool scripts and the links to the machine's sh, less and
+    // ssh-keygen are run by the other tool tests and end to end.)
     // The console switches terminals through "/dev/console"; on a simulated
     // host that must find nothing.
     EXPECT_FALSE(fs::exists(_root + "/dev/console"));
@@ -69,11 +49,7 @@ TEST_F(SimHostCreate, MakesEveryFile) {
     Result rsa =
         Tool("/usr/lib/zolva/openssh/bin/ssh-keygen", {"-l", "-f", _root + "/etc/ssh/ssh_host_rsa_key"});
     ASSERT_EQ(rsa.status, 0) << rsa.err;
-    std::vector<std::string> words = Words(rsa.out);
-    ASSERT_GE(words.size(), 3u) << rsa.out;
-    EXPECT_EQ(words[0], "2048");
-    EXPECT_EQ(words[1].rfind("SHA256:", 0), 0u);
-    EXPECT_EQ(words.back(), "(RSA)");
+    EXPECT_TRUE(std::regex_match(rsa.out, std::regex("2048 SHA256:\\S+ .*\\(RSA\\)\n"))) << rsa.out;
 
     // A DSA key only where ssh-keygen can still make one, and then whole.
     std::string dsaKey = _root + "/etc/ssh/ssh_host_dsa_key";
@@ -88,15 +64,6 @@ TEST_F(SimHostCreate, MakesEveryFile) {
     std::istringstream syslog(ReadFile(_root + "/var/log/syslog.log"));
     std::regex line(R"(^\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d\.\d{3}Z [\w-]+\[\d+\]: [a-z]+\.[a-z]+: .+$)");
     for (std::string l; std::getline(syslog, l);) EXPECT_TRUE(std::regex_match(l, line)) << l;
-}
-
-TEST_F(SimHostCreate, PrintsOneLineNamingTheRoot) {
-    std::string root = _dir + "/second";
-    Result r = SimHost({"create", root});
-    ASSERT_EQ(r.status, 0) << r.err;
-    EXPECT_EQ(Lines(r.out), 1u);
-    EXPECT_NE(r.out.find(root), std::string::npos) << r.out;
-    EXPECT_EQ(SimHost({"get", root, "/network/dns/hostname"}).out, "\"host1\"\n");
 }
 
 TEST_F(SimHostCreate, RefusesAnExistingRootUnlessForced) {
@@ -115,30 +82,54 @@ TEST_F(SimHostCreate, RefusesAnExistingRootUnlessForced) {
     EXPECT_EQ(after.status, 0) << after.err;
     EXPECT_EQ(after.out, "true\n");
 
-    // An existing empty folder is taken as it is; a file is not a folder.
+    // An existing empty folder is taken as it is, with one line naming it; a
+    // file is not a folder.
     fs::create_directory(_dir + "/empty");
-    EXPECT_EQ(SimHost({"create", _dir + "/empty"}).status, 0);
+    Result empty = SimHost({"create", _dir + "/empty"});
+    ASSERT_EQ(empty.status, 0) << empty.err;
+    EXPECT_EQ(Lines(empty.out), 1u);
+    EXPECT_NE(empty.out.find(_dir + "/empty"), std::string::npos) << empty.out;
+    EXPECT_EQ(SimHost({"get", _dir + "/empty", "/network/dns/hostname"}).out, "\"host1\"\n");
     WriteFile(_dir + "/file", "x");
     Result onFile = SimHost({"create", _dir + "/file", "--force"});
     EXPECT_TRUE(Fails(onFile));
     EXPECT_EQ(Lines(onFile.err), 1u);
 }
 
+// Bad arguments of every command: one failure, nothing made or changed.
 TEST_F(SimHostCreate, BadArgumentsFailCleanly) {
-    std::string fresh = _dir + "/fresh";
-    const std::vector<std::vector<std::string>> cases = {{},
-                                                         {"create"},
-                                                         {"create", fresh, "--hostname"},
-                                                         {"create", fresh, "--hostname", "bad name"},
-                                                         {"create", fresh, "--hostname", "semi;colon"},
-                                                         {"create", fresh, "--bogus"},
-                                                         {"create", fresh, "extra", "argument"},
-                                                         {"frobnicate", _root},
-                                                         {"get", _root},
-                                                         {"set", _root, "/x"},
-                                                         {"remove", _root, "/x", "y"}};
-    for (const auto& args : cases) EXPECT_TRUE(Fails(SimHost(args))) << args.size() << " arguments";
+    const std::string fresh = _dir + "/fresh", missing = _dir + "/missing";
+    const std::string state = ReadFile(_root + "/host.json");
+    const std::string passdb = ReadFile(_root + "/etc/pam-wrapper/passdb");
+    const std::vector<std::vector<std::string>> cases = {
+        {},
+        {"create"},
+        {"create", fresh, "--hostname"},
+        {"create", fresh, "--hostname", "bad name"},
+        {"create", fresh, "--hostname", "semi;colon"},
+        {"create", fresh, "--bogus"},
+        {"create", fresh, "extra", "argument"},
+        {"create", fresh, "--password", "a:b"},
+        {"create", fresh, "--password", ""},
+        {"create", fresh, "--password"},
+        {"frobnicate", _root},
+        {"get", _root},
+        {"set", _root, "/x"},
+        {"remove", _root, "/x", "y"},
+        {"login", missing},
+        {"login"},
+        {"card", _root, "insert", "bob", "1:2"},
+        {"card", _root, "insert", "bob", ""},
+        {"card", _root, "insert", "bob", "12", "--slot", "7"},
+        {"card", _root, "insert", "bob"},
+        {"card", _root, "pull", "--slot", "x"},
+        {"card", _root, "eject"},
+        {"card", missing, "pull"}};
+    for (const auto& args : cases) EXPECT_TRUE(Fails(SimHost(args))) << ::testing::PrintToString(args);
     EXPECT_FALSE(fs::exists(fresh));
+    EXPECT_FALSE(fs::exists(missing));
+    EXPECT_EQ(ReadFile(_root + "/host.json"), state);
+    EXPECT_EQ(ReadFile(_root + "/etc/pam-wrapper/passdb"), passdb);
 }
 
 TEST_F(SimHostState, SetGetRemoveRoundTrip) {
@@ -151,9 +142,7 @@ TEST_F(SimHostState, SetGetRemoveRoundTrip) {
     const Case cases[] = {
         {"/network/vnics/0/ipv4/address", "\"10.0.0.7\"", "", "\"10.0.0.7\""},
         {"/network/vnics/0/ipv4/address", "10.0.0.8", "", "\"10.0.0.8\""},  // not JSON: a string
-        {"/system/welcomeMessage", "Hands off", "", "\"Hands off\""},
         {"/vms/running", "3", "", "3"},
-        {"/hostAgent/lockdownPossible", "false", "", "false"},
         {"/new/deep/member", "{\"a\": [1]}", "/new/deep/member/a/0", "1"},
         {"/advancedOptions/~1UserVars~1VelkTimeOut", "30", "", "30"},
         {"/network/dns/servers/-", "\"10.0.0.1\"", "/network/dns/servers/1", "\"10.0.0.1\""},
@@ -195,13 +184,10 @@ TEST_F(SimHostState, BadInputIsOneLineAndLeavesTheStateAlone) {
     std::string deepPointer;
     for (int i = 0; i < 600; ++i) deepPointer += "/a";
     const Case cases[] = {
-        {deepState.c_str(), {"get", _root, "/a"}, "host.json: arrays and objects nested deeper than"},
         {deepState.c_str(), {"set", _root, "/a", "1"}, "host.json: arrays and objects nested deeper than"},
         {nullptr, {"set", _root, "/a", deepValue}, "the value nests arrays and objects deeper than"},
         {nullptr, {"set", _root, deepPointer, "1"}, "would nest deeper than"},
-        {nullptr, {"get", missing, "/vms"}, "nohost/host.json"},
         {nullptr, {"set", missing, "/vms", "1"}, "nohost/host.json"},
-        {"{\"network\": ", {"get", _root, "/network"}, "host.json: parse error"},
         {"{\"network\": ", {"set", _root, "/network", "1"}, "host.json: parse error"},
         {"[1, 2]", {"remove", _root, "/0"}, "not a JSON object"},
         {"", {"get", _root, "/vms"}, "host.json"},
@@ -230,45 +216,21 @@ TEST_F(SimHostState, BadInputIsOneLineAndLeavesTheStateAlone) {
 using SimHostPam = HostTest;
 
 // The host's PAM services: the console's service checks passwords against
-// the host's own file, every other service denies.
+// the host's own file (exercised by PamServices), every other service denies.
 TEST_F(SimHostPam, ServicesAndDemoLogin) {
     Result login = SimHost({"login", _root});
     ASSERT_EQ(login.status, 0) << login.err;
     EXPECT_TRUE(std::regex_match(login.out, std::regex("Demo login: user root, password demo-[a-z0-9]{6}\n")))
         << login.out;
 
-    const std::string dir = _root + "/etc/pam-wrapper";
-    const std::string velk = ReadFile(dir + "/velk");
-    for (const char* type : {"auth", "account", "password"}) {
-        SCOPED_TRACE(type);
-        std::smatch m;
-        ASSERT_TRUE(
-            std::regex_search(velk, m,
-                              std::regex(std::string("(^|\n)") + type +
-                                         "\\s+required\\s+(/\\S+/pam_matrix\\.so)\\s+\\[passdb=(.*)\\]\n")))
-            << velk;
-        EXPECT_TRUE(fs::exists(m[2].str())) << m[2];
-        // The root holds a blank, so the argument is bracketed.
-        EXPECT_EQ(m[3].str(), dir + "/passdb");
-    }
     EXPECT_EQ(
-        ReadFile(dir + "/other"),
+        ReadFile(_root + "/etc/pam-wrapper/other"),
         "auth\trequired\tpam_deny.so\naccount\trequired\tpam_deny.so\npassword\trequired\tpam_deny.so\n");
 
     const std::string other = _dir + "/other";
     ASSERT_EQ(SimHost({"create", other, "--password", "s3cret pass"}).status, 0);
     EXPECT_EQ(ReadFile(other + "/etc/pam-wrapper/passdb"), "root:s3cret pass:velk\nguest:guest-pass:other\n");
     EXPECT_EQ(SimHost({"login", other}).out, "Demo login: user root, password s3cret pass\n");
-
-    for (const std::vector<std::string>& bad :
-         std::vector<std::vector<std::string>>{{"create", _dir + "/bad1", "--password", "a:b"},
-                                               {"create", _dir + "/bad2", "--password", ""},
-                                               {"create", _dir + "/bad3", "--password"},
-                                               {"login", _dir + "/missing"},
-                                               {"login"}}) {
-        EXPECT_TRUE(Fails(SimHost(bad))) << bad[0];
-    }
-    EXPECT_FALSE(fs::exists(_dir + "/bad1/host.json"));
 }
 
 // A card puts its user into the password file with the PIN as secret; a
@@ -283,21 +245,6 @@ TEST_F(SimHostPam, CardInsertAndPull) {
     EXPECT_NE(ReadFile(passdb).find("\nguest:9999:other\n"), std::string::npos) << ReadFile(passdb);
     ASSERT_EQ(SimHost({"card", _root, "pull", "--slot", "0"}).status, 0);
     EXPECT_TRUE(State()["smartCards"]["slots"][0]["token"].is_null());
-
-    const std::string state = ReadFile(_root + "/host.json");
-    const std::string users = ReadFile(passdb);
-    for (const std::vector<std::string>& bad :
-         std::vector<std::vector<std::string>>{{"card", _root, "insert", "bob", "1:2"},
-                                               {"card", _root, "insert", "bob", ""},
-                                               {"card", _root, "insert", "bob", "12", "--slot", "7"},
-                                               {"card", _root, "insert", "bob"},
-                                               {"card", _root, "pull", "--slot", "x"},
-                                               {"card", _root, "eject"},
-                                               {"card", _dir + "/missing", "pull"}}) {
-        EXPECT_TRUE(Fails(SimHost(bad))) << bad[2];
-    }
-    EXPECT_EQ(ReadFile(_root + "/host.json"), state);
-    EXPECT_EQ(ReadFile(passdb), users);
 }
 
 }  // namespace

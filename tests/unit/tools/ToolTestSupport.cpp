@@ -47,48 +47,43 @@ void HostTest::SetUp() {
 }
 
 void HostTest::TearDown() {
-    for (const Pending& p : _pending) waitpid(p.pid, nullptr, 0);
+    for (const auto& [pid, output] : _pending) waitpid(pid, nullptr, 0);
     std::error_code ec;
     std::filesystem::remove_all(_dir, ec);
 }
 
 pid_t HostTest::Start(const std::vector<std::string>& argv, const std::vector<std::string>& env) {
-    Pending p;
-    p.out = _dir + "/out." + std::to_string(_outputs);
-    p.err = _dir + "/err." + std::to_string(_outputs++);
+    const std::string output = _dir + "/output." + std::to_string(_outputs++);
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
     posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_addopen(&actions, 1, p.out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
-    posix_spawn_file_actions_addopen(&actions, 2, p.err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644);
+    for (int fd : {1, 2})
+        posix_spawn_file_actions_addopen(&actions, fd, (output + ".fd" + std::to_string(fd)).c_str(),
+                                         O_WRONLY | O_CREAT | O_TRUNC, 0644);
     std::vector<char*> args;
     for (const std::string& a : argv) args.push_back(const_cast<char*>(a.c_str()));
     args.push_back(nullptr);
     std::vector<char*> envp;
     for (const std::string& e : env) envp.push_back(const_cast<char*>(e.c_str()));
     envp.push_back(nullptr);
-    p.pid = -1;
-    int rc =
-        posix_spawn(&p.pid, args[0], &actions, nullptr, args.data(), env.empty() ? environ : envp.data());
+    pid_t pid = -1;
+    int rc = posix_spawn(&pid, args[0], &actions, nullptr, args.data(), env.empty() ? environ : envp.data());
     posix_spawn_file_actions_destroy(&actions);
     EXPECT_EQ(rc, 0) << "cannot run " << argv[0];
     if (rc != 0) return -1;
-    _pending.push_back(p);
-    return p.pid;
+    _pending[pid] = output;
+    return pid;
 }
 
 Result HostTest::Finish(pid_t pid) {
-    auto it = std::find_if(_pending.begin(), _pending.end(), [&](const Pending& p) { return p.pid == pid; });
+    auto it = _pending.find(pid);
     if (it == _pending.end()) return {};
-    Pending p = *it;
+    const std::string output = it->second;
     _pending.erase(it);
     int status = 0;
     if (waitpid(pid, &status, 0) != pid) return {};
-    Result r;
-    r.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-    r.out = ReadFile(p.out);
-    r.err = ReadFile(p.err);
-    return r;
+    return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, ReadFile(output + ".fd1"),
+            ReadFile(output + ".fd2")};
 }
 
 Result HostTest::Run(const std::vector<std::string>& argv, const std::vector<std::string>& env) {

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 #include <sys/types.h>
 
+#include <map>
 #include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
@@ -50,12 +51,7 @@ protected:
     std::string _root;  // the host, in a path with a space and a quote
 
 private:
-    struct Pending {
-        pid_t pid;
-        std::string out;
-        std::string err;
-    };
-    std::vector<Pending> _pending;
+    std::map<pid_t, std::string> _pending;  // where each started program's output goes
     int _outputs = 0;
 };
 
