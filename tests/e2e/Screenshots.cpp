@@ -23,31 +23,27 @@ struct Picture {
     Step reach;  // from the welcome screen to the screen to draw
 };
 
-::testing::AssertionResult Login(Terminal& t) {
-    t.SendKey("F2");
-    return t.WaitForText("Login Name:");
-}
-
-::testing::AssertionResult Menu(Terminal& t) { return E2e::LogInToMenu(t); }
-
-::testing::AssertionResult Network(Terminal& t) {
-    if (auto menu = E2e::LogInToMenu(t); !menu) return menu;
-    if (auto selected = E2e::SelectEntry(t, "Configure Management Network"); !selected) return selected;
-    t.SendKey("Enter");
-    return t.WaitForText("Network Adapters");
-}
-
-::testing::AssertionResult Shutdown(Terminal& t) {
-    if (auto submitted = E2e::SubmitLogin(t, E2e::kRootPassword, "", "F12"); !submitted) return submitted;
-    return t.WaitForText("Forcefully terminate running VMs");
-}
-
 const Picture kPictures[] = {
     {"welcome.svg", "The welcome screen", [](Terminal&) { return ::testing::AssertionSuccess(); }},
-    {"login.svg", "The login dialog", Login},
-    {"menu.svg", "The system customization menu", Menu},
-    {"network.svg", "The management network window", Network},
-    {"shutdown.svg", "Shutting down or restarting the host", Shutdown},
+    {"login.svg", "The login dialog",
+     [](Terminal& t) {
+         t.SendKey("F2");
+         return t.WaitForText("Login Name:");
+     }},
+    {"menu.svg", "The system customization menu", [](Terminal& t) { return E2e::LogInToMenu(t); }},
+    {"network.svg", "The management network window",
+     [](Terminal& t) {
+         if (auto menu = E2e::LogInToMenu(t); !menu) return menu;
+         if (auto selected = E2e::SelectEntry(t, "Configure Management Network"); !selected) return selected;
+         t.SendKey("Enter");
+         return t.WaitForText("Network Adapters");
+     }},
+    {"shutdown.svg", "Shutting down or restarting the host",
+     [](Terminal& t) {
+         if (auto submitted = E2e::SubmitLogin(t, E2e::kRootPassword, "", "F12"); !submitted)
+             return submitted;
+         return t.WaitForText("Forcefully terminate running VMs");
+     }},
 };
 
 }  // namespace

@@ -9,7 +9,9 @@
 #include <atomic>
 #include <filesystem>
 #include <fstream>
+#include <future>
 #include <iterator>
+#include <memory>
 #include <random>
 #include <set>
 #include <sstream>
@@ -55,47 +57,26 @@ std::vector<pid_t> Tree(pid_t pid) {
     return all;
 }
 
-// Where the password shows in the environment or command line of the console
-// or its descendants, watched from a thread of its own for as long as it runs:
-// children come and go quickly.
-class ProcessWatch {
-public:
-    ProcessWatch(pid_t pid, std::string secret)
-        : _secret(std::move(secret)), _thread([this, pid] {
-              while (!_stop.load()) {
-                  for (pid_t p : Tree(pid)) {
-                      for (const char* file : {"environ", "cmdline"}) {
-                          const std::string path = "/proc/" + std::to_string(p) + "/" + file;
-                          const std::string data = ReadAll(path);
-                          if (data.empty()) continue;
-                          ++_reads;
-                          if (data.find(_secret) == std::string::npos) continue;
-                          std::lock_guard lock(_mutex);
-                          _found.insert(path + " (" + ReadAll("/proc/" + std::to_string(p) + "/comm") + ")");
-                      }
-                  }
-                  std::this_thread::sleep_for(Duration(2));
-              }
-          }) {}
-    ~ProcessWatch() { Stop(); }
-    void Stop() {
-        _stop = true;
-        if (_thread.joinable()) _thread.join();
+// Where `secret` shows in the environment or command line of `pid` or its
+// descendants, watched from a thread of its own until `stop`: children come
+// and go quickly. `reads` counts the files read.
+std::set<std::string> WatchProcesses(pid_t pid, const std::string& secret, const std::atomic<bool>& stop,
+                                     long& reads) {
+    std::set<std::string> found;
+    while (!stop.load()) {
+        for (pid_t p : Tree(pid)) {
+            for (const char* file : {"environ", "cmdline"}) {
+                const std::string path = "/proc/" + std::to_string(p) + "/" + file;
+                const std::string data = ReadAll(path);
+                reads += !data.empty();
+                if (data.find(secret) != std::string::npos)
+                    found.insert(path + " (" + ReadAll("/proc/" + std::to_string(p) + "/comm") + ")");
+            }
+        }
+        std::this_thread::sleep_for(Duration(2));
     }
-    std::set<std::string> Found() {
-        std::lock_guard lock(_mutex);
-        return _found;
-    }
-    long Reads() const { return _reads.load(); }
-
-private:
-    const std::string _secret;
-    std::atomic<bool> _stop{false};
-    std::atomic<long> _reads{0};
-    std::mutex _mutex;
-    std::set<std::string> _found;
-    std::thread _thread;
-};
+    return found;
+}
 
 // Places of `secret` in the readable memory of `pid`: "address: context".
 // `scanned` receives the number of bytes read.
@@ -104,10 +85,7 @@ std::vector<std::string> SearchMemory(pid_t pid, const std::string& secret, size
     scanned = 0;
     std::ifstream maps("/proc/" + std::to_string(pid) + "/maps");
     const int mem = open(("/proc/" + std::to_string(pid) + "/mem").c_str(), O_RDONLY | O_CLOEXEC);
-    if (mem < 0) {
-        found.push_back("cannot open /proc/PID/mem: " + std::string(strerror(errno)));
-        return found;
-    }
+    if (mem < 0) return {"cannot open /proc/PID/mem: " + std::string(strerror(errno))};
     std::string line;
     std::vector<char> buffer;
     while (std::getline(maps, line)) {
@@ -153,7 +131,13 @@ TEST_F(SecretsTest, PasswordKeptNowhereAfterTheLogin) {
     const std::string password = UniquePassword();
     SetRootPassword(host, password);
     ASSERT_TRUE(Start());
-    ProcessWatch watch(t->Pid(), password);
+    std::atomic<bool> stop{false};
+    long reads = 0;
+    std::future<std::set<std::string>> watch =
+        std::async(std::launch::async, WatchProcesses, t->Pid(), password, std::cref(stop), std::ref(reads));
+    // Stops the watch also when an assertion below ends the test early.
+    const std::unique_ptr<std::atomic<bool>, void (*)(std::atomic<bool>*)> stopper(
+        &stop, [](std::atomic<bool>* s) { *s = true; });
     t->SendKey("F2");
     ASSERT_TRUE(t->WaitForText("Login Name:"));
     t->SendKey("Enter");
@@ -175,12 +159,13 @@ TEST_F(SecretsTest, PasswordKeptNowhereAfterTheLogin) {
     ASSERT_TRUE(t->WaitQuiet(Duration(300)));
     t->SendKey("Esc");
     ASSERT_TRUE(t->WaitQuiet(Duration(300)));
-    watch.Stop();
+    stop = true;
+    const std::set<std::string> found = watch.get();
     ASSERT_FALSE(t->HasExited());
 
     // The environment and command lines.
-    EXPECT_GT(watch.Reads(), 0);
-    for (const std::string& place : watch.Found()) ADD_FAILURE() << "the password is in " << place;
+    EXPECT_GT(reads, 0);
+    for (const std::string& place : found) ADD_FAILURE() << "the password is in " << place;
 
     // The terminal output.
     const std::string output = t->Output();

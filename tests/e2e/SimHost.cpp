@@ -1,8 +1,8 @@
 #include "SimHost.hpp"
 
 #include <fcntl.h>
-#include <poll.h>
 #include <spawn.h>
+#include <sys/mman.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -30,51 +30,30 @@ bool Keep() {
 }  // namespace
 
 ProgramOutput RunProgram(const std::vector<std::string>& args) {
-    int outPipe[2], errPipe[2];
-    if (pipe2(outPipe, O_CLOEXEC) != 0 || pipe2(errPipe, O_CLOEXEC) != 0)
-        throw std::runtime_error(std::string("pipe: ") + strerror(errno));
+    // Output into memory files, read once the program has ended.
+    const int out = memfd_create("out", MFD_CLOEXEC), err = memfd_create("err", MFD_CLOEXEC);
+    if (out < 0 || err < 0) throw std::runtime_error(std::string("memfd_create: ") + strerror(errno));
     posix_spawn_file_actions_t actions;
     posix_spawn_file_actions_init(&actions);
     posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_adddup2(&actions, outPipe[1], 1);
-    posix_spawn_file_actions_adddup2(&actions, errPipe[1], 2);
+    posix_spawn_file_actions_adddup2(&actions, out, 1);
+    posix_spawn_file_actions_adddup2(&actions, err, 2);
     std::vector<char*> argv;
     for (const auto& a : args) argv.push_back(const_cast<char*>(a.c_str()));
     argv.push_back(nullptr);
     pid_t pid = -1;
-    int rc = posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ);
+    const int rc = posix_spawn(&pid, argv[0], &actions, nullptr, argv.data(), environ);
     posix_spawn_file_actions_destroy(&actions);
-    close(outPipe[1]);
-    close(errPipe[1]);
     ProgramOutput result;
-    if (rc != 0) {
-        close(outPipe[0]);
-        close(errPipe[0]);
-        throw std::runtime_error("cannot run " + args[0] + ": " + strerror(rc));
+    while (rc == 0 && waitpid(pid, &result.status, 0) < 0 && errno == EINTR) {
     }
-    struct pollfd fds[2] = {{outPipe[0], POLLIN, 0}, {errPipe[0], POLLIN, 0}};
-    std::string* sinks[2] = {&result.out, &result.err};
-    int open = 2;
-    while (open > 0) {
-        if (poll(fds, 2, -1) < 0) {
-            if (errno == EINTR) continue;
-            break;
-        }
-        for (int i = 0; i < 2; ++i) {
-            if (fds[i].fd < 0 || !(fds[i].revents & (POLLIN | POLLHUP | POLLERR))) continue;
-            char buf[4096];
-            ssize_t n = read(fds[i].fd, buf, sizeof buf);
-            if (n > 0) {
-                sinks[i]->append(buf, size_t(n));
-            } else if (n == 0 || errno != EINTR) {
-                close(fds[i].fd);
-                fds[i].fd = -1;
-                --open;
-            }
-        }
+    for (auto [fd, sink] : {std::pair{out, &result.out}, {err, &result.err}}) {
+        char buf[4096];
+        lseek(fd, 0, SEEK_SET);
+        for (ssize_t n; (n = read(fd, buf, sizeof buf)) > 0;) sink->append(buf, size_t(n));
+        close(fd);
     }
-    while (waitpid(pid, &result.status, 0) < 0 && errno == EINTR) {
-    }
+    if (rc != 0) throw std::runtime_error("cannot run " + args[0] + ": " + strerror(rc));
     return result;
 }
 
@@ -112,8 +91,6 @@ void SimHost::Fail(const std::string& operation, const std::string& message) {
     if (!message.empty()) args.push_back(message);
     Tool(args);
 }
-
-void SimHost::Clear(const std::string& operation) { Tool({"fail", _root, operation, "--clear"}); }
 
 void SimHost::Slow(const std::string& tool, double seconds) {
     Tool({"slow", _root, tool, std::to_string(seconds)});

@@ -40,13 +40,12 @@ public:
     void Set(const std::string& pointer, const nlohmann::json& value);
     void Remove(const std::string& pointer);
 
-    // Makes the host control operation fail with `message` (the tool's
-    // default text when empty) until Clear is called for it.
+    // Makes the host control operation (or host tool) fail with `message`
+    // (the tool's default text when empty).
     void Fail(const std::string& operation, const std::string& message = "");
-    void Clear(const std::string& operation);
     // Makes the calls of a host tool ("qelbacktrace", or "services.sh stop"
     // for the calls with that argument) wait `seconds` before they act; 0
-    // clears it. (Fail and Clear take such tool names too.)
+    // clears it.
     void Slow(const std::string& tool, double seconds);
     // Completes a reboot: the host comes up with its saved configuration.
     void Boot();

@@ -17,18 +17,13 @@ constexpr Rgb kVga[16] = {
 // The palette entry of a cell colour, with `fallback` for the default colour;
 // -1 for a direct colour.
 int IndexOf(const CellColor& color, int fallback) {
-    switch (color.kind) {
-        case CellColor::Kind::Default:
-            return fallback;
-        case CellColor::Kind::Indexed:
-            return color.index;
-        case CellColor::Kind::Direct:
-            return -1;
-    }
-    return fallback;
+    if (color.kind == CellColor::Kind::Direct) return -1;
+    return color.kind == CellColor::Kind::Indexed ? color.index : fallback;
 }
 
-// The colours a cell is drawn in.
+// The colours a cell is drawn in on the linux console: the default colours
+// are palette entries 7 and 0, reverse video swaps foreground and background,
+// bold brightens a foreground of 0 to 7 (to 8 to 15) and blink a background.
 struct Resolved {
     Rgb fg, bg;
 };
@@ -41,12 +36,23 @@ Resolved Resolve(const Screenshot& shot, const Cell& cell) {
         std::swap(fg, bg);
         std::swap(fgRgb, bgRgb);
     }
-    // The console shows bold as a bright foreground and blink as a bright
-    // background.
     if (cell.bold && fg >= 0 && fg < 8) fg += 8;
     if (cell.blink && bg >= 0 && bg < 8) bg += 8;
     return {fg >= 0 ? shot.palette[size_t(fg) & 0xff] : fgRgb,
             bg >= 0 ? shot.palette[size_t(bg) & 0xff] : bgRgb};
+}
+
+Rgb ForegroundOf(const Screenshot& shot, const Cell& cell) { return Resolve(shot, cell).fg; }
+Rgb BackgroundOf(const Screenshot& shot, const Cell& cell) { return Resolve(shot, cell).bg; }
+
+std::string XmlEscape(std::string_view text) {
+    static const char* const kEntities[] = {"&amp;", "&lt;", "&gt;", "&quot;", "&apos;"};
+    std::string out;
+    for (char c : text) {
+        const size_t special = std::string_view("&<>\"'").find(c);
+        out += special == std::string_view::npos ? std::string(1, c) : kEntities[special];
+    }
+    return out;
 }
 
 bool IsBlank(const Cell& cell) { return cell.text.empty() || cell.text == " "; }
@@ -87,19 +93,6 @@ Screenshot Capture(const Terminal& t) {
             shot.palette[size_t(change.index)] = change.rgb;
     }
     return shot;
-}
-
-Rgb ForegroundOf(const Screenshot& shot, const Cell& cell) { return Resolve(shot, cell).fg; }
-Rgb BackgroundOf(const Screenshot& shot, const Cell& cell) { return Resolve(shot, cell).bg; }
-
-std::string XmlEscape(std::string_view text) {
-    static const char* const kEntities[] = {"&amp;", "&lt;", "&gt;", "&quot;", "&apos;"};
-    std::string out;
-    for (char c : text) {
-        const size_t special = std::string_view("&<>\"'").find(c);
-        out += special == std::string_view::npos ? std::string(1, c) : kEntities[special];
-    }
-    return out;
 }
 
 std::string ToSvg(const Screenshot& shot, const SvgOptions& options) {

@@ -33,15 +33,6 @@ struct Screenshot {
 // Take it once the screen is quiet.
 Screenshot Capture(const Terminal& t);
 
-// The colours a cell shows on the linux console: the default colours are
-// palette entries 7 and 0, reverse video swaps foreground and background,
-// bold brightens a foreground of 0 to 7 (to 8 to 15) and blink a background.
-Rgb ForegroundOf(const Screenshot& shot, const Cell& cell);
-Rgb BackgroundOf(const Screenshot& shot, const Cell& cell);
-
-// Text with the five XML special characters written as entities.
-std::string XmlEscape(std::string_view text);
-
 struct SvgOptions {
     int cellWidth = 9;    // pixels per column
     int cellHeight = 18;  // pixels per row

@@ -13,6 +13,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <regex>
 #include <stdexcept>
 
 namespace E2e {
@@ -61,6 +62,17 @@ char ColorChar(const CellColor& c) {
     return '?';
 }
 
+// Writes all of `bytes` to `fd`; false on an error.
+bool WriteAll(int fd, std::string_view bytes) {
+    while (!bytes.empty()) {
+        const ssize_t n = write(fd, bytes.data(), bytes.size());
+        if (n < 0 && errno == EINTR) continue;
+        if (n <= 0) return false;
+        bytes.remove_prefix(size_t(n));
+    }
+    return true;
+}
+
 std::string Trim(const std::string& s) {
     size_t b = s.find_first_not_of(' ');
     if (b == std::string::npos) return {};
@@ -89,87 +101,54 @@ std::string ToString(const CellColor& color) {
 }
 
 std::string LinuxPaletteFilter::Feed(std::string_view bytes, std::vector<PaletteChange>& changes) {
-    std::string in = _held;
-    in.append(bytes);
+    const std::string in = _held + std::string(bytes);
     _held.clear();
     std::string out;
-    out.reserve(in.size());
-    size_t i = 0;
-    while (i < in.size()) {
-        size_t esc = in.find('\x1b', i);
-        if (esc == std::string::npos) {
-            out.append(in, i, std::string::npos);
-            break;
-        }
+    for (size_t i = 0; i < in.size();) {
+        const size_t esc = in.find('\x1b', i);
         out.append(in, i, esc - i);
-        const size_t rest = in.size() - esc;
+        if (esc == std::string::npos) break;
+        const std::string_view rest = std::string_view(in).substr(esc);
         // Incomplete prefixes of the two sequences wait for the next read.
-        if (rest < 2 || (in[esc + 1] == ']' && rest < 3) ||
-            (in[esc + 1] == ']' && in[esc + 2] == 'P' && rest < 10)) {
-            _held = in.substr(esc);
+        if (rest.size() < 3 ? std::string_view("\x1b]").starts_with(rest)
+                            : rest.starts_with("\x1b]P") && rest.size() < 10) {
+            _held = rest;
             break;
         }
-        if (in[esc + 1] == ']' && in[esc + 2] == 'R') {
+        int d[7];
+        bool hex = rest.starts_with("\x1b]P");
+        for (size_t k = 0; k < 7 && hex; ++k) hex = (d[k] = HexDigit(rest[3 + k])) >= 0;
+        if (rest.starts_with("\x1b]R")) {
             changes.push_back({-1, {}});
             i = esc + 3;
-            continue;
+        } else if (hex) {
+            changes.push_back(
+                {d[0], {uint8_t(d[1] * 16 + d[2]), uint8_t(d[3] * 16 + d[4]), uint8_t(d[5] * 16 + d[6])}});
+            i = esc + 10;
+        } else {
+            out += '\x1b';
+            i = esc + 1;
         }
-        if (in[esc + 1] == ']' && in[esc + 2] == 'P') {
-            int digits[7];
-            bool hex = true;
-            for (int k = 0; k < 7; ++k) hex = hex && (digits[k] = HexDigit(in[esc + 3 + k])) >= 0;
-            if (hex) {
-                changes.push_back({digits[0],
-                                   {uint8_t(digits[1] * 16 + digits[2]), uint8_t(digits[3] * 16 + digits[4]),
-                                    uint8_t(digits[5] * 16 + digits[6])}});
-                i = esc + 10;
-                continue;
-            }
-        }
-        out += '\x1b';
-        i = esc + 1;
     }
     return out;
 }
 
 bool ParsePaletteOsc(std::string_view body, std::vector<PaletteChange>& changes) {
-    std::vector<std::string_view> parts;
-    for (size_t start = 0;;) {
-        size_t semi = body.find(';', start);
-        parts.push_back(body.substr(start, semi == std::string_view::npos ? semi : semi - start));
-        if (semi == std::string_view::npos) break;
-        start = semi + 1;
-    }
-    if (parts.size() < 3 || parts.size() % 2 == 0 || parts[0] != "4") return false;
-    std::vector<PaletteChange> found;
-    for (size_t p = 1; p + 1 < parts.size(); p += 2) {
-        int index = 0;
-        if (parts[p].empty()) return false;
-        for (char c : parts[p]) {
-            if (c < '0' || c > '9') return false;
-            index = index * 10 + (c - '0');
-        }
-        std::string_view colour = parts[p + 1];
-        if (colour.substr(0, 4) != "rgb:") return false;
-        colour.remove_prefix(4);
+    static const std::string kPair =
+        ";(\\d{1,5});rgb:([0-9a-fA-F]{1,4})/([0-9a-fA-F]{1,4})/([0-9a-fA-F]{1,4})";
+    static const std::regex whole("4(" + kPair + ")+"), pair(kPair);
+    const std::string text(body);
+    if (!std::regex_match(text, whole)) return false;
+    for (std::sregex_iterator it(text.begin(), text.end(), pair), end; it != end; ++it) {
         uint8_t rgb[3];
-        for (int k = 0; k < 3; ++k) {
-            size_t slash = colour.find('/');
-            std::string_view comp = colour.substr(0, slash);
-            if (comp.empty() || comp.size() > 4 || (k < 2) == (slash == std::string_view::npos)) return false;
-            unsigned value = 0;
-            for (char c : comp) {
-                int d = HexDigit(c);
-                if (d < 0) return false;
-                value = value * 16 + unsigned(d);
-            }
-            const unsigned max = (1u << (4 * comp.size())) - 1;
-            rgb[k] = uint8_t((value * 255 + max / 2) / max);
-            colour.remove_prefix(slash == std::string_view::npos ? colour.size() : slash + 1);
+        for (size_t k = 0; k < 3; ++k) {
+            // 1 to 4 hex digits scaled to 8 bits.
+            const std::string comp = (*it)[k + 2];
+            const unsigned long max = (1ul << (4 * comp.size())) - 1;
+            rgb[k] = uint8_t((std::stoul(comp, nullptr, 16) * 255 + max / 2) / max);
         }
-        found.push_back({index, {rgb[0], rgb[1], rgb[2]}});
+        changes.push_back({std::stoi((*it)[1]), {rgb[0], rgb[1], rgb[2]}});
     }
-    changes.insert(changes.end(), found.begin(), found.end());
     return true;
 }
 
@@ -245,7 +224,10 @@ void Terminal::ReaderLoop() {
         if (n < 0 && (errno == EINTR || errno == EAGAIN)) continue;
         std::lock_guard lock(_mutex);
         if (n > 0) {
-            Feed(buf, size_t(n));
+            _output.append(buf, size_t(n));
+            _lastOutput = Clock::now();
+            const std::string pass = _filter.Feed(std::string_view(buf, size_t(n)), _palette);
+            vterm_input_write(_vt, pass.data(), pass.size());
         } else {
             // EIO: every holder of the slave side has closed it.
             _eof = true;
@@ -255,24 +237,9 @@ void Terminal::ReaderLoop() {
     }
 }
 
-void Terminal::Feed(const char* data, size_t size) {
-    _bytes += size;
-    _output.append(data, size);
-    _lastOutput = Clock::now();
-    std::string pass = _filter.Feed(std::string_view(data, size), _palette);
-    if (!pass.empty()) vterm_input_write(_vt, pass.data(), pass.size());
-}
-
 void Terminal::OnOutput(const char* bytes, size_t len, void* user) {
     // Answers of the emulated terminal (cursor reports and the like).
-    auto* self = static_cast<Terminal*>(user);
-    while (len > 0) {
-        ssize_t n = write(self->_master, bytes, len);
-        if (n < 0 && errno == EINTR) continue;
-        if (n <= 0) return;
-        bytes += n;
-        len -= size_t(n);
-    }
+    WriteAll(static_cast<Terminal*>(user)->_master, std::string_view(bytes, len));
 }
 
 int Terminal::OnOsc(const char* command, size_t len, void* user) {
@@ -291,15 +258,7 @@ int Terminal::Rows() const {
 }
 
 void Terminal::Send(std::string_view bytes) {
-    while (!bytes.empty()) {
-        ssize_t n = write(_master, bytes.data(), bytes.size());
-        if (n < 0 && errno == EINTR) continue;
-        if (n <= 0) {
-            ADD_FAILURE() << "writing to the terminal failed: " << strerror(errno);
-            return;
-        }
-        bytes.remove_prefix(size_t(n));
-    }
+    if (!WriteAll(_master, bytes)) ADD_FAILURE() << "writing to the terminal failed: " << strerror(errno);
 }
 
 void Terminal::SendKey(std::string_view name) {
@@ -546,7 +505,7 @@ std::vector<Pos> Terminal::FindAll(std::string_view text) const {
 std::string Terminal::DumpLocked(bool colors) const {
     std::string out =
         "screen " + std::to_string(_cols) + "x" + std::to_string(_rows) + ", TERM=" + _options.term + ", " +
-        std::to_string(_bytes) + " bytes received" +
+        std::to_string(_output.size()) + " bytes received" +
         (colors ? "; colours: . default, 0-f index, + higher index, # RGB; attributes: r reverse, "
                   "b bold, u underline"
                 : "") +
@@ -593,7 +552,7 @@ std::optional<Rgb> Terminal::PaletteColor(int index) const {
 
 size_t Terminal::BytesReceived() const {
     std::lock_guard lock(_mutex);
-    return _bytes;
+    return _output.size();
 }
 
 std::string Terminal::Output() const {

@@ -1,8 +1,6 @@
-// A program running in a pseudo-terminal whose screen is kept by libvterm:
-// the test reads cells (text, colours, attributes), sends keys and signals as
-// a person at the terminal would, resizes the terminal and waits for the
-// program to exit. A reader thread drains the pty all the time, so the program
-// never blocks on output while the test is busy elsewhere.
+// A program running in a pseudo-terminal whose screen is kept by libvterm. A
+// reader thread drains the pty all the time, so the program never blocks on
+// output while the test is busy elsewhere.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -39,8 +37,7 @@ struct Rgb {
 };
 std::string ToString(const Rgb& rgb);  // "#rrggbb"
 
-// A cell colour as the program set it: the terminal's default, an index into
-// the palette (SGR 30-37/40-47 or 38;5;n) or a direct RGB colour.
+// A cell colour as the program set it.
 struct CellColor {
     enum class Kind { Default, Indexed, Direct };
     Kind kind = Kind::Default;
@@ -73,21 +70,20 @@ struct PaletteChange {
     bool operator==(const PaletteChange&) const = default;
 };
 
-// Cuts the linux console's palette sequences out of an output stream:
-// "ESC ] P n rrggbb" (n one hex digit, no terminator) and "ESC ] R" (reset).
-// libvterm would take either for the start of an OSC string and swallow the
-// text after it. A sequence split across reads is held back until complete.
+// Cuts the linux console's palette sequences ("ESC ] P n rrggbb", "ESC ] R")
+// out of an output stream, appending them to `changes`: libvterm would take
+// either for the start of an OSC string and swallow the text after it. A
+// sequence split across reads is held back until complete.
 class LinuxPaletteFilter {
 public:
-    // Returns the bytes to pass on; palette changes found are appended to `changes`.
     std::string Feed(std::string_view bytes, std::vector<PaletteChange>& changes);
 
 private:
     std::string _held;
 };
 
-// Parses the body of an xterm palette OSC, "4;n;rgb:rr/gg/bb[;n;rgb:...]"
-// (1 to 4 hex digits per component). Returns false when it is not one.
+// Parses the body of an xterm palette OSC, "4;n;rgb:rr/gg/bb[;n;rgb:...]";
+// false when it is not one.
 bool ParsePaletteOsc(std::string_view body, std::vector<PaletteChange>& changes);
 
 struct TerminalOptions {
@@ -114,18 +110,16 @@ public:
 
     // --- input ---
     void Send(std::string_view bytes);
-    // A named key with the bytes the terminal type sends for it (terminfo):
-    // F1..F12, Up, Down, Left, Right, Home, End, PageUp, PageDown, Insert,
-    // Delete, Backspace, and Enter, Esc, Tab. Fails the test when the
-    // terminal type has no such key.
+    // A named key (F1..F12, Up, Home, PageUp, Insert, Backspace, Enter, Esc,
+    // ...) with the bytes the terminal type sends for it (terminfo). Fails
+    // the test when the terminal type has no such key.
     void SendKey(std::string_view name);
-    // The terminfo string `capname` (e.g. "kf2") of terminal type `term`, or
-    // "" when it has none.
+    // The terminfo string `capname` ("kf2") of `term`; "" when it has none.
     static std::string TerminfoString(const std::string& term, const std::string& capname);
     void Signal(int sig);
     // Sets the pty's size; the kernel signals SIGWINCH to the program.
     void Resize(int cols, int rows);
-    // The pty's current termios settings (as the program left them).
+    // The pty's termios settings as the program left them.
     struct termios Modes() const;
 
     // --- waiting ---
@@ -137,11 +131,9 @@ public:
     ::testing::AssertionResult WaitForTextGone(std::string_view text, Duration timeout = kDefaultTimeout) {
         return WaitFor(text, false, timeout);
     }
-    // Waits until the program has written nothing for `quiet`, counted from
-    // its last output but from no earlier than the call.
+    // Waits until the program has written nothing for `quiet` since the call.
     ::testing::AssertionResult WaitQuiet(Duration quiet = kQuiet, Duration timeout = kDefaultTimeout);
-    // Waits for the program to end (draining its output meanwhile); the raw
-    // wait status, or nothing on timeout.
+    // Waits for the program to end; the raw wait status, nothing on timeout.
     std::optional<int> WaitForExit(Duration timeout = kDefaultTimeout);
     // Waits for the program to end with exit status `code`.
     ::testing::AssertionResult ExitsWith(int code, Duration timeout = kDefaultTimeout);
@@ -161,10 +153,9 @@ public:
     std::optional<Pos> Find(std::string_view text) const;
     std::vector<Pos> FindAll(std::string_view text) const;
     bool Contains(std::string_view text) const { return Find(text).has_value(); }
-    // Whether the row reads `text` from column `col` on; the failure shows the screen.
+    // Whether the row reads `text` from column `col` on.
     ::testing::AssertionResult HasTextAt(int col, int row, std::string_view text) const;
-    // Whether `text` is on the screen (Shows) or nowhere on it (Lacks); the
-    // failure shows the screen.
+    // Whether `text` is on the screen (Shows) or nowhere on it (Lacks).
     ::testing::AssertionResult Shows(std::string_view text) const { return OnScreen(text, true); }
     ::testing::AssertionResult Lacks(std::string_view text) const { return OnScreen(text, false); }
     // The screen with row numbers; with `colors`, lines with the foreground,
@@ -176,8 +167,7 @@ public:
     // The colour last set for `index` since the last palette reset.
     std::optional<Rgb> PaletteColor(int index) const;
     size_t BytesReceived() const;
-    // Every byte the program wrote to the terminal so far, as it came (also
-    // what libvterm was not shown, such as palette sequences).
+    // Every byte the program wrote to the terminal so far.
     std::string Output() const;
 
     // --- the program as a process ---
@@ -185,13 +175,11 @@ public:
     int OpenDescriptors() const;
     // The program's resident set in KiB (VmRSS), -1 once it has gone.
     long ResidentKiB() const;
-    // The direct children of the program with their process state letter
-    // ('S', 'R', 'Z', ...).
+    // The direct children of the program with their state letter ('Z', ...).
     std::vector<std::pair<pid_t, char>> Children() const;
 
 private:
     void ReaderLoop();
-    void Feed(const char* data, size_t size);
     ::testing::AssertionResult WaitFor(std::string_view text, bool shown, Duration timeout);
     ::testing::AssertionResult OnScreen(std::string_view text, bool shown) const;
     // The first `most` places of `text`, row by row.
@@ -215,8 +203,7 @@ private:
     VTerm* _vt = nullptr;
     VTermScreen* _screen = nullptr;
     int _cols, _rows;
-    bool _eof = false;  // the pty's slave side is closed
-    size_t _bytes = 0;
+    bool _eof = false;    // the pty's slave side is closed
     std::string _output;  // every byte received
     std::chrono::steady_clock::time_point _lastOutput;
     LinuxPaletteFilter _filter;

@@ -10,36 +10,23 @@
 namespace E2e {
 namespace {
 
-struct RefusedTerm {
-    const char* name;
-    const char* term;
-    const char* reason;  // what the message and the log line say
-};
-void PrintTo(const RefusedTerm& c, std::ostream* os) { *os << c.name; }
-
-class RefusedTermTest : public ::testing::TestWithParam<RefusedTerm> {};
-
-TEST_P(RefusedTermTest, SaysWhyAndFailsTheStart) {
-    SimHost host;
-    Terminal t(host.Console(GetParam().term));
-    ASSERT_TRUE(t.ExitsWith(1));
-    const std::string message = std::string("velk: cannot start: ") + GetParam().reason;
-    EXPECT_TRUE(t.Shows(message));
-    EXPECT_EQ(
-        host.ConsoleLog(std::string("user.err: Cannot start on this terminal: ") + GetParam().reason, t.Pid())
-            .size(),
-        1u);
-    // An instance that never ran does not take the PID file.
-    EXPECT_FALSE(host.Exists("/var/run/velk.pid"));
+TEST(RefusedTermTest, SaysWhyAndFailsTheStart) {
+    for (const auto& [term, reason] :
+         {std::pair{"", "TERM is not set"},
+          {"no-such-terminal-type", "unknown terminal type \"no-such-terminal-type\""},
+          {"dumb", "terminal type \"dumb\" cannot place the cursor"}}) {
+        SCOPED_TRACE(std::string("TERM=") + term);
+        SimHost host;
+        Terminal t(host.Console(term));
+        ASSERT_TRUE(t.ExitsWith(1));
+        EXPECT_TRUE(t.Shows(std::string("velk: cannot start: ") + reason));
+        EXPECT_EQ(host.ConsoleLog(std::string("user.err: Cannot start on this terminal: ") + reason, t.Pid())
+                      .size(),
+                  1u);
+        // An instance that never ran does not take the PID file.
+        EXPECT_FALSE(host.Exists("/var/run/velk.pid"));
+    }
 }
-
-INSTANTIATE_TEST_SUITE_P(Terms, RefusedTermTest,
-                         ::testing::Values(RefusedTerm{"Empty", "", "TERM is not set"},
-                                           RefusedTerm{"Unknown", "no-such-terminal-type",
-                                                       "unknown terminal type \"no-such-terminal-type\""},
-                                           RefusedTerm{"Dumb", "dumb",
-                                                       "terminal type \"dumb\" cannot place the cursor"}),
-                         [](const auto& info) { return std::string(info.param.name); });
 
 // Standard input at its end from the start (no terminal at all): a clear
 // refusal, not a loop on the end of input.
@@ -56,19 +43,15 @@ TEST(NoTerminalTest, InputFromDevNullIsRefusedAtOnce) {
     EXPECT_EQ(run.out, "velk: cannot start: standard input and output must be a terminal\r\n");
 }
 
-struct Size {
-    int cols, rows;
-};
-void PrintTo(const Size& s, std::ostream* os) { *os << s.cols << "x" << s.rows; }
-
-class SmallTerminalTest : public ::testing::TestWithParam<Size> {};
+// Columns and lines.
+class SmallTerminalTest : public ::testing::TestWithParam<std::pair<int, int>> {};
 
 // Below the smallest size every dialog fits in, nothing is drawn but the
 // notice and no key is taken: a blind F2, name and password open no dialog
 // and log nobody in. Signals still end the console.
 TEST_P(SmallTerminalTest, ShowsTheNoticeAndTakesNoKeys) {
     SimHost host;
-    Terminal t(host.Console("linux", GetParam().cols, GetParam().rows));
+    Terminal t(host.Console("linux", GetParam().first, GetParam().second));
     ASSERT_TRUE(t.WaitForText("Terminal too small"));
     EXPECT_NE(t.RegionText(0, 0, t.Cols(), t.Rows()).find("at least 78 columns and 23 lines"),
               std::string::npos)
@@ -78,8 +61,8 @@ TEST_P(SmallTerminalTest, ShowsTheNoticeAndTakesNoKeys) {
     ASSERT_TRUE(t.WaitQuiet(Duration(300)));
     EXPECT_TRUE(t.Shows("too small"));
     EXPECT_TRUE(host.ConsoleLog("Authentication").empty());
-    EXPECT_EQ(host.ConsoleLog("Terminal too small: " + std::to_string(GetParam().cols) + "x" +
-                                  std::to_string(GetParam().rows) + ", the console needs at least 78x23",
+    EXPECT_EQ(host.ConsoleLog("Terminal too small: " + std::to_string(GetParam().first) + "x" +
+                                  std::to_string(GetParam().second) + ", the console needs at least 78x23",
                               t.Pid())
                   .size(),
               1u);
@@ -88,7 +71,8 @@ TEST_P(SmallTerminalTest, ShowsTheNoticeAndTakesNoKeys) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Sizes, SmallTerminalTest,
-                         ::testing::Values(Size{20, 5}, Size{40, 10}, Size{77, 25}, Size{80, 22}));
+                         ::testing::Values(std::pair{20, 5}, std::pair{40, 10}, std::pair{77, 25},
+                                           std::pair{80, 22}));
 
 // Ctrl-S stops nothing: the next key still opens the login dialog, and the
 // termination signal ends the console at once.

@@ -1,6 +1,7 @@
-// The harness itself: the palette parsers on split and malformed input, and a
-// small curses program driven through the pty on each terminal type the
-// console tests use.
+// The harness itself: the palette parsers on split and malformed input, exit
+// statuses and terminfo keys. Reading cells, colours and keys on every
+// terminal type is checked against the console's own screens
+// (WelcomeScreenTest).
 #include <signal.h>
 #include <sys/wait.h>
 
@@ -65,123 +66,21 @@ TEST(ParsePaletteOscTest, Forms) {
     }
 }
 
-TerminalOptions Probe(const std::string& term, int cols = 80, int rows = 24, std::string status = "0") {
-    TerminalOptions options;
-    options.program = CURSES_PROBE_BIN;
-    options.args = {status};
-    options.term = term;
-    options.cols = cols;
-    options.rows = rows;
-    options.env = {"LANG=C.UTF-8", "ESCDELAY=25"};
-    return options;
-}
-
-struct TermCase {
-    const char* term;
-    bool color;
-};
-void PrintTo(const TermCase& c, std::ostream* os) { *os << "TERM=" << c.term; }
-
-class ProbeTest : public ::testing::TestWithParam<TermCase> {};
-
-TEST_P(ProbeTest, ScreenKeysAndResize) {
-    Terminal t(Probe(GetParam().term));
-    ASSERT_TRUE(t.WaitForText("PROBE READY 80x24"));
-    EXPECT_EQ(t.Find("PROBE READY"), (Pos{2, 1}));
-    EXPECT_EQ(t.RowTextTrimmed(1), "│ PROBE READY 80x24" + std::string(60, ' ') + "│");
-    EXPECT_EQ(t.CellAt(0, 0).text, "┌");
-    EXPECT_EQ(t.CellAt(79, 23).text, "┘");
-    std::string rule;
-    for (int i = 0; i < 17; ++i) rule += "─";
-    EXPECT_EQ(t.RegionText(2, 0, 17, 3), rule + " PROBE READY 80x24");
-    const Cell upper = t.CellAt(10, 5), lower = t.CellAt(10, 18);
-    if (GetParam().color) {
-        EXPECT_TRUE(upper.bg.IsIndex(6)) << ToString(upper.bg) << "\n" << t.Dump(true);
-        EXPECT_TRUE(upper.fg.IsIndex(7)) << ToString(upper.fg);
-        EXPECT_TRUE(lower.bg.IsIndex(3)) << ToString(lower.bg);
-        EXPECT_FALSE(upper.reverse);
-        // 333 on curses' 0..1000 scale, truncated to 8 bits by terminfo.
-        EXPECT_EQ(t.PaletteColor(6), (Rgb{84, 84, 84}));
-        EXPECT_EQ(t.PaletteColor(3), (Rgb{254, 204, 0}));
-        EXPECT_EQ(t.PaletteColor(2), std::nullopt);
-    } else {
-        EXPECT_EQ(upper.bg, CellColor{}) << t.Dump(true);
-        EXPECT_TRUE(upper.reverse) << t.Dump(true);
-        EXPECT_FALSE(lower.reverse);
-        EXPECT_TRUE(t.PaletteLog().empty());
-    }
-    EXPECT_GT(t.BytesReceived(), 200u);
-
-    t.Resize(100, 31);
-    ASSERT_TRUE(t.WaitForText("PROBE READY 100x31"));
-    EXPECT_EQ(t.Cols(), 100);
-    EXPECT_EQ(t.Rows(), 31);
-    EXPECT_EQ(t.CellAt(99, 30).text, "┘") << t.Dump();
-
-    // Keys with the bytes terminfo gives; a lone Esc after ESCDELAY.
-    for (const auto& [key, shown] :
-         {std::pair{"F2", "KEY KEY_F(2)"}, std::pair{"Up", "KEY KEY_UP"}, std::pair{"Down", "KEY KEY_DOWN"},
-          std::pair{"Enter", "KEY ^J"}, std::pair{"Tab", "KEY ^I"}}) {
-        t.SendKey(key);
-        EXPECT_TRUE(t.WaitForText(shown)) << key;
-    }
-    t.Send("\x1b");
-    EXPECT_TRUE(t.WaitForText("KEY ^["));
-    t.Send("q");
-    EXPECT_TRUE(t.ExitsWith(0));
-}
-
-INSTANTIATE_TEST_SUITE_P(Terms, ProbeTest,
-                         ::testing::Values(TermCase{"linux", true}, TermCase{"xterm-256color", true},
-                                           TermCase{"xterm", false}, TermCase{"vt100", false}),
-                         [](const auto& info) {
-                             std::string name = info.param.term;
-                             for (char& c : name)
-                                 if (c == '-') c = '_';
-                             return name;
-                         });
+// A program in the terminal: `script` run by the shell.
+TerminalOptions Shell(const std::string& script) { return {"/bin/sh", {"-c", script}}; }
 
 TEST(TerminalTest, ExitStatusAndSignals) {
-    {
-        Terminal t(Probe("linux", 80, 24, "7"));
-        ASSERT_TRUE(t.WaitForText("PROBE READY"));
-        EXPECT_FALSE(t.HasExited());
-        t.Send("q");
-        EXPECT_EQ(Terminal::DescribeStatus(t.WaitForExit()), "exit 7");
-    }
-    {
-        Terminal t(Probe("linux"));
-        ASSERT_TRUE(t.WaitForText("PROBE READY"));
-        t.Signal(SIGKILL);
-        EXPECT_EQ(Terminal::DescribeStatus(t.WaitForExit()), "signal 9");
-        EXPECT_FALSE(t.ExitsWith(0, Duration(10)));
-    }
-    {
-        Terminal t(Probe("linux"));
-        ASSERT_TRUE(t.WaitForText("PROBE READY"));
-        EXPECT_EQ(t.WaitForExit(Duration(100)), std::nullopt);
-        EXPECT_EQ(Terminal::DescribeStatus(std::nullopt), "running");
-    }
-}
-
-TEST(TerminalTest, FailuresCarryTheScreen) {
-    Terminal t(Probe("linux"));
-    ASSERT_TRUE(t.WaitForText("PROBE READY"));
-    ::testing::AssertionResult missing = t.WaitForText("NOT THERE", Duration(100));
-    EXPECT_FALSE(missing);
-    EXPECT_NE(std::string(missing.message()).find(" 1|│ PROBE READY 80x24"), std::string::npos)
-        << missing.message();
-    const std::string colors = t.Dump(true);
-    // The box is drawn with the screen's own (default) colours over both halves.
-    EXPECT_NE(colors.find(" bg|." + std::string(78, '6') + ".|"), std::string::npos) << colors;
-    EXPECT_NE(colors.find(" bg|." + std::string(78, '3') + ".|"), std::string::npos) << colors;
-}
-
-TEST(TerminalTest, MissingProgramExits127) {
-    TerminalOptions options = Probe("linux");
-    options.program = "/nonexistent/program";
-    Terminal t(options);
-    EXPECT_TRUE(t.ExitsWith(127));
+    Terminal exits(Shell("echo READY; read line; exit 7")), killed(Shell("echo READY; exec /bin/sleep 60")),
+        runs(Shell("echo READY; exec /bin/sleep 60"));
+    for (Terminal* t : {&exits, &killed, &runs}) ASSERT_TRUE(t->WaitForText("READY"));
+    EXPECT_FALSE(exits.HasExited());
+    exits.SendKey("Enter");
+    EXPECT_EQ(Terminal::DescribeStatus(exits.WaitForExit()), "exit 7");
+    killed.Signal(SIGKILL);
+    EXPECT_EQ(Terminal::DescribeStatus(killed.WaitForExit()), "signal 9");
+    EXPECT_FALSE(killed.ExitsWith(0, Duration(10)));
+    EXPECT_EQ(runs.WaitForExit(Duration(100)), std::nullopt);
+    EXPECT_EQ(Terminal::DescribeStatus(std::nullopt), "running");
 }
 
 TEST(TerminalTest, TerminfoStrings) {
