@@ -1,9 +1,7 @@
-// Malformed and extreme host states, each met at the start and swapped in
-// while the console runs (followed by the refresh signal), on the welcome
-// screen and, logged in, on every page of the system customization menu: the
-// console keeps running, or, where it cannot start, ends with one line saying
-// why; the screen stays inside its frame; and the good state, back again,
-// brings back the normal welcome screen.
+// Malformed and extreme host states, met at the start and swapped in (with
+// the refresh signal), on the welcome screen and on every page of the menu:
+// the console keeps running inside its frame, or, where it cannot start, ends
+// with one line saying why; the good state brings the normal screen back.
 #include <signal.h>
 #include <sys/wait.h>
 
@@ -25,9 +23,8 @@ std::vector<std::string> Lines(const Terminal& t) {
 
 class HostStateTest : public ConsoleTestWithParam<HostStateCase> {
 protected:
-    // The normal welcome screen of the default host, drawn inside its frame.
-    // The product heading is read once, at its first use: a console that
-    // started on a broken state shows none (`heading` false).
+    // The normal welcome screen, inside its frame. The heading is read once:
+    // a console that started on a broken state shows none (`heading` false).
     ::testing::AssertionResult NormalWelcome(bool heading = true) {
         for (const char* text :
              {"Acme Server 9", "2 x Acme Processor A9-2400 @ 2.40GHz", "16 GiB Memory", "http://host1/",
@@ -94,9 +91,7 @@ TEST_P(HostStateTest, SwappedIn) {
 // quick welcome-screen ones.
 class HostStateMenuTest : public HostStateTest {
 protected:
-    // Walks every entry of the menu (14, by Down from the first one),
-    // checking the frame at each; then logs out. Fails when the console ends
-    // on the way.
+    // Walks the menu's 14 entries checking the frame at each, then logs out.
     void WalkMenu(const char* when) {
         SCOPED_TRACE(when);
         for (int i = 0; i < 14; ++i) {

@@ -1,6 +1,5 @@
-// A logged-in console in "Configure Management Network": opening its
-// dialogs, typing into them, leaving with the changes applied, and reading
-// what the apply logged.
+// A logged-in console in "Configure Management Network": its dialogs, and
+// leaving with the changes applied.
 #pragma once
 
 #include <string>
@@ -52,7 +51,6 @@ protected:
         return t->WaitForText(kDialogs[entry].shown);
     }
 
-    // Presses Enter in the dialog of `entry` and waits until it has closed.
     ::testing::AssertionResult Confirm(Entry entry) {
         t->SendKey("Enter");
         return t->WaitForTextGone(kDialogs[entry].shown);
@@ -65,8 +63,7 @@ protected:
         return Confirm(entry) << " (" << kDialogs[entry].entry << ")";
     }
 
-    // Esc in the network window, Y to the question, then waits for the end
-    // of the apply.
+    // Esc, Y to the question, then waits for the end of the apply.
     ::testing::AssertionResult LeaveAndApply(const std::string& question = kRestartQuestion) {
         t->SendKey("Esc");
         if (auto asked = t->WaitForText(question); !asked) return asked;
@@ -74,17 +71,15 @@ protected:
         return WaitForLog(host, "Network settings changed.");
     }
 
-    // Static IPv4 in the IPv4 dialog: from the first row down to the static
-    // choice, mark it, then the fields.
+    // The IPv4 dialog's keys for a static address.
     static std::vector<std::string> StaticIpv4(const std::string& address, const std::string& mask,
                                                const std::string& gateway) {
         return {"Down", "Down", " ", "Down", address, "Down", mask, "Down", gateway};
     }
 
-    // Every dialog of the window confirmed with a change: adapters (zonic1
-    // added), VLAN 20, static IPv4 and IPv6, DNS servers, a dotted host name
-    // and two suffixes. Without DHCP the automatic DNS row cannot be chosen:
-    // the manual one is current and marked.
+    // Every dialog confirmed with a change: zonic1 added, VLAN 20, static IPv4
+    // and IPv6, DNS servers (without DHCP the manual row is already marked), a
+    // dotted host name and two suffixes.
     ::testing::AssertionResult EditEverything() {
         const std::pair<Entry, std::vector<std::string>> edits[] = {
             {kAdapters, {"Down", " "}},

@@ -1,6 +1,5 @@
-// Restarting and testing the management network with the real console: the
-// interface taken down and up with its new lease on screen, and the ping and
-// resolver checks answered by the simulated network.
+// Restarting and testing the management network: the interface taken down
+// and up with its new lease on screen, and the ping and resolver checks.
 #include <algorithm>
 #include <filesystem>
 #include <fstream>

@@ -94,9 +94,6 @@ TEST_P(PowerTest, StopsVmsThenPowersTheHost) {
 
 const PowerCase kPowerCases[] = {
     {"ShutDown", "F2", false, "poweroff", "Shutting down host", "Shut Down Host", "Shutdown in progress..."},
-    {"ShutDownTerminatingVms", "F2", true, "poweroff", "Shutting down host", "Shut Down Host",
-     "Shutdown in progress..."},
-    {"Restart", "F11", false, "reboot", "Rebooting host", "Restart Host", "Restart in progress..."},
     {"RestartTerminatingVms", "F11", true, "reboot", "Rebooting host", "Restart Host",
      "Restart in progress..."},
 };
@@ -158,36 +155,29 @@ TEST_F(ResetTest, F11ResetsThenEnterRestarts) {
     EXPECT_TRUE(t->ExitsWith(0, Duration(3000)));
 }
 
-TEST_F(LogViewerTest, DigitOpensTheLogInThePagerAndQReturns) {
+// The pager opens on its digit and Q returns to the menu, which reads keys
+// again. A termination or resize while the pager runs ends the pager and the
+// console at once, instead of waiting for somebody to leave the pager.
+TEST_F(LogViewerTest, PagerQuitsWithQAndEndsOnSignals) {
     const std::string marker = "e2e-marker-line for the pager";
     host.WriteFile("/var/log/syslog.log", host.ReadFile("/var/log/syslog.log") +
                                               "2024-01-01T00:00:00Z e2e[1]: user.info: " + marker + "\n");
-    ASSERT_TRUE(StartInMenu());
-    ASSERT_TRUE(SelectEntry(*t, "View System Logs"));
-    ASSERT_TRUE(t->WaitForText("<1> Syslog"));
-    t->Send("1");
-    ASSERT_TRUE(t->WaitForText(marker));
-    EXPECT_TRUE(t->Shows("<Q> Quit </> RegExp Search <H> Help"));
-    EXPECT_TRUE(t->Lacks("System Customization"));
-
-    t->Send("q");
-    ASSERT_TRUE(WaitForMenu(*t));
-    EXPECT_TRUE(t->Shows("<1> Syslog"));
-    EXPECT_TRUE(t->Lacks(marker));
-    // The console reads keys again.
-    t->SendKey("Esc");
-    EXPECT_TRUE(WaitForWelcome(*t));
-}
-
-// A termination or resize while the pager runs ends the pager and the console
-// at once, instead of waiting for somebody to leave the pager.
-TEST_F(LogViewerTest, SignalsEndThePagerAndTheConsole) {
-    for (const int sig : {SIGTERM, SIGWINCH}) {
-        ASSERT_TRUE(StartInMenu());
+    for (const int sig : {0, SIGTERM, SIGWINCH}) {
+        if (!t) {
+            ASSERT_TRUE(StartInMenu());
+        }
         ASSERT_TRUE(SelectEntry(*t, "View System Logs"));
         ASSERT_TRUE(t->WaitForText("<1> Syslog"));
         t->Send("1");
-        ASSERT_TRUE(t->WaitForText("<Q> Quit"));
+        ASSERT_TRUE(t->WaitForText(marker));
+        EXPECT_TRUE(t->Shows("<Q> Quit </> RegExp Search <H> Help"));
+        EXPECT_TRUE(t->Lacks("System Customization"));
+        if (!sig) {
+            t->Send("q");
+            ASSERT_TRUE(WaitForMenu(*t));
+            EXPECT_TRUE(t->Lacks(marker));
+            continue;
+        }
         const auto children = t->Children();
         ASSERT_EQ(children.size(), 1u);
         t->Signal(sig);

@@ -92,6 +92,8 @@ void SimHost::Fail(const std::string& operation, const std::string& message) {
     Tool(args);
 }
 
+void SimHost::Clear(const std::string& operation) { Tool({"fail", _root, operation, "--clear"}); }
+
 void SimHost::Slow(const std::string& tool, double seconds) {
     Tool({"slow", _root, tool, std::to_string(seconds)});
 }

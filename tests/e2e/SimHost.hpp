@@ -41,8 +41,9 @@ public:
     void Remove(const std::string& pointer);
 
     // Makes the host control operation (or host tool) fail with `message`
-    // (the tool's default text when empty).
+    // (the tool's default text when empty) until Clear is called for it.
     void Fail(const std::string& operation, const std::string& message = "");
+    void Clear(const std::string& operation);
     // Makes the calls of a host tool ("qelbacktrace", or "services.sh stop"
     // for the calls with that argument) wait `seconds` before they act; 0
     // clears it.

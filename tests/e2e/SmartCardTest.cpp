@@ -81,10 +81,8 @@ TEST_F(SmartCardTest, PasswordSessionOutlivesThePulledCard) {
     t->Signal(SIGUSR1);
     ASSERT_TRUE(t->WaitQuiet(Duration(300)));
     EXPECT_FALSE(t->HasExited()) << t->Dump();
+    EXPECT_TRUE(t->Shows("System Customization"));
     EXPECT_TRUE(NotLogged(host, "Logging out user id"));
-    t->SendKey("Esc");
-    ASSERT_TRUE(WaitForWelcome(*t)) << t->Dump();
-    EXPECT_TRUE(LoggedOnce(host, "User root logged out.", t->Pid()));
 }
 
 }  // namespace
