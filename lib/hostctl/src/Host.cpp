@@ -17,7 +17,7 @@
 #include <string>
 #include <system_error>
 
-#include "UnsupportedHostBackend.hpp"
+#include "linux/UnsupportedHostBackend.hpp"
 #include "hostctl/Backend.hpp"
 #include "hostctl/SimState.hpp"
 
