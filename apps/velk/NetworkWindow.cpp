@@ -402,12 +402,24 @@ std::string NetworkWindow::ScopedIpv6Gateway() const {
 }
 
 void NetworkWindow::Apply() {
+    // The steps reach the host as one change: a host may apply them together.
+    QelCtl::Network::NetworkInfoImpl networkInfo;
+    try {
+        networkInfo.BeginChange();
+    } catch (const HostCtlException& e) {
+        Fail(std::string("Applying network configuration failed: ") + e.what());
+    }
     ApplyAdapters();
     const bool vlanChanged = ApplyVlan();
     ApplyIpConfiguration();
     ApplyGateways();
     ApplyRenewal(vlanChanged);
     ApplyDns();
+    try {
+        networkInfo.CommitChange();
+    } catch (const HostCtlException& e) {
+        Fail(std::string("Applying network configuration failed: ") + e.what());
+    }
     if (ipv6Enabled != ipv6EnabledAtStart) {
         RebootConfirmDialog reboot(this, true);
         reboot.Execute();

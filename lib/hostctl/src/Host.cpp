@@ -17,9 +17,10 @@
 #include <string>
 #include <system_error>
 
-#include "linux/UnsupportedHostBackend.hpp"
 #include "hostctl/Backend.hpp"
 #include "hostctl/SimState.hpp"
+#include "linux/LinuxBackend.hpp"
+#include "linux/LinuxPaths.hpp"
 
 namespace HostCtl::Lib {
 
@@ -77,7 +78,7 @@ void InitLocked(HostChoice& c) {
     c.chosen = true;
     c.simulated = false;
     c.root.clear();
-    c.backend = MakeUnsupportedHostBackend();
+    c.backend = Linux::MakeLinuxBackend();
 }
 
 const char* FacilityName(int facility) {
@@ -170,10 +171,14 @@ const std::string& HostRoot() {
 
 std::string HostPath(const std::string& absolutePath) {
     HostChoice& c = Choice();
-    std::lock_guard<std::mutex> lock(c.mutex);
-    InitLocked(c);
-    if (!c.simulated || absolutePath.empty() || absolutePath[0] != '/' || c.root == "/") return absolutePath;
-    return c.root + absolutePath;
+    if (absolutePath.empty() || absolutePath[0] != '/') return absolutePath;
+    {
+        std::lock_guard<std::mutex> lock(c.mutex);
+        InitLocked(c);
+        if (c.simulated) return c.root == "/" ? absolutePath : c.root + absolutePath;
+    }
+    // Outside the lock: the real host's mapping reads its configuration once.
+    return Linux::MapHostPath(absolutePath);
 }
 
 Backend& GetBackend() {
@@ -190,7 +195,7 @@ void SetBackend(std::unique_ptr<Backend> backend) {
     if (backend)
         c.backend = std::move(backend);
     else
-        c.backend = c.simulated ? MakeSimulatedBackend(c.root) : MakeUnsupportedHostBackend();
+        c.backend = c.simulated ? MakeSimulatedBackend(c.root) : Linux::MakeLinuxBackend();
 }
 
 void OpenLog(const char* ident, int option, int facility) {
@@ -272,7 +277,26 @@ void ReplaceFile(const std::string& path, const std::string& text, mode_t mode) 
     if (rename(tmp.c_str(), path.c_str()) < 0) {
         const int err = errno;
         unlink(tmp.c_str());
-        throw fail("cannot replace", err);
+        // A file that is a mount point of its own (containers bind-mount
+        // /etc/hosts, /etc/hostname and /etc/resolv.conf) cannot be renamed
+        // over: it is rewritten in place instead.
+        if (err != EBUSY) throw fail("cannot replace", err);
+        const int in = open(path.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
+        if (in < 0) throw fail("cannot write in place", errno);
+        for (size_t done = 0; done < text.size();) {
+            const ssize_t n = write(in, text.data() + done, text.size() - done);
+            if (n < 0 && errno == EINTR) continue;
+            if (n < 0) {
+                const int werr = errno;
+                close(in);
+                throw fail("cannot write in place", werr);
+            }
+            done += size_t(n);
+        }
+        const int serr = fsync(in) < 0 ? errno : 0;
+        close(in);
+        if (serr != 0) throw fail("cannot write in place", serr);
+        return;
     }
     // Make the rename itself durable.
     const size_t slash = path.rfind('/');

@@ -110,6 +110,10 @@ void NetworkInfoImpl::SetQelIpv6Enabled(bool enabled) { GetBackend().SetIpv6Enab
 
 std::vector<std::string> NetworkInfoImpl::GetVirtualNicNames() { return GetBackend().GetVnicNames(); }
 
+void NetworkInfoImpl::BeginChange() { GetBackend().BeginNetworkChange(); }
+
+void NetworkInfoImpl::CommitChange() { GetBackend().CommitNetworkChange(); }
+
 void NetworkInfoImpl::DisableNetDumper() { GetBackend().DisableNetDumper(); }
 
 void NetworkInfoImpl::ClearNetworkConfig() { GetBackend().ClearNetworkConfig(); }

@@ -12,6 +12,7 @@ int main() {
     printf("simulated=%d\n", HostCtl::Lib::IsSimulatedHost() ? 1 : 0);
     printf("root=%s\n", HostCtl::Lib::HostRoot().c_str());
     printf("path=%s\n", HostCtl::Lib::HostPath("/bin/ls").c_str());
+    printf("tool=%s\n", HostCtl::Lib::HostPath("/bin/hrm-cmd").c_str());
     try {
         printf("hostname=%s\n", QelCtl::Network::DnsConfigImpl("defaultTcpipStack").GetHostname().c_str());
     } catch (const HostCtl::Lib::HostCtlException& e) {

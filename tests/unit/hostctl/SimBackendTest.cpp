@@ -3,8 +3,8 @@
 #include <cstring>
 #include <filesystem>
 
+#include "LinuxBackend.hpp"
 #include "TestSupport.hpp"
-#include "UnsupportedHostBackend.hpp"
 
 namespace {
 
@@ -378,27 +378,30 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
     EXPECT_THROW(backend.GetPnics(), HostCtlException);
 }
 
-// The real machine's backend refuses every operation with a text that names
-// it (one call with a text of its own per direction of the enabled flag).
-TEST(UnsupportedHostBackendTest, RefusesOperationsByName) {
-    std::unique_ptr<Backend> backend = HostCtl::Lib::MakeUnsupportedHostBackend();
+// A Debian host's backend refuses what such a host does not have with a text
+// naming the operation and the reason, without touching the machine.
+TEST(LinuxBackendTest, RefusesWhatADebianHostLacks) {
+    std::unique_ptr<Backend> backend = HostCtl::Lib::Linux::MakeLinuxBackend();
     const std::vector<std::pair<const char*, std::function<void(Backend&)>>> calls = {
-        {"renewing a DHCP lease", CALL(RenewVnicDhcpLease, "qk0")},
-        {"disabling a virtual NIC", CALL(SetVnicEnabled, "qk0", false)},
-        {"enabling a virtual NIC", CALL(SetVnicEnabled, "qk0", true)},
-        {"setting the IPv6 default gateway", CALL(SetIpv6DefaultGateway, "defaultTcpipStack", Ipv6Address())},
+        {"listing a distributed switch's uplinks: a Debian host has no distributed switches",
+         CALL(GetDvsUplinkPorts, "dvs0")},
+        {"creating a host-local distributed port: a Debian host has no distributed switches",
+         CALL(AddDvsHostLocalPort, "dvs0", "10")},
+        {"handing devices to the driver VM: a Debian host has no driver VM", CALL(SetDriverVmOwned, {"x"})},
+        {"setting firewall ruleset \"sshServer\": a Debian host's firewall is not managed by Velk",
+         CALL(SetFirewallRulesetEnabled, "sshServer", true)},
     };
-    for (const auto& [operation, call] : calls) {
-        SCOPED_TRACE(operation);
+    for (const auto& [text, call] : calls) {
+        SCOPED_TRACE(text);
         try {
             call(*backend);
             ADD_FAILURE() << "no failure";
         } catch (const HostCtlException& e) {
-            EXPECT_EQ(std::string(e.what()).rfind(std::string(operation) + ": not available on this host", 0),
-                      0u)
-                << e.what();
+            EXPECT_EQ(std::string(e.what()), text);
         }
     }
+    EXPECT_TRUE(backend->GetDistributedSwitchNames().empty());
+    EXPECT_EQ(backend->GetDriverVmState(), 0);
 }
 
 #undef OP

@@ -76,6 +76,12 @@ public:
     virtual void RenewVnicDhcpLease(const std::string& vnic) = 0;
     // Down (dynamic addresses given up) or up (obtained anew).
     virtual void SetVnicEnabled(const std::string& vnic, bool enabled) = 0;
+    // A set of network changes made as one: between Begin and Commit a host
+    // may stage the network setters and apply them together at Commit (a
+    // failure to apply throws there). A host that applies each setter at
+    // once does nothing here.
+    virtual void BeginNetworkChange() {}
+    virtual void CommitNetworkChange() {}
     // IPv6 in the running kernel; the setter decides the next boot.
     virtual bool GetIpv6Enabled() = 0;
     virtual void SetIpv6Enabled(bool enabled) = 0;

@@ -29,7 +29,8 @@ bool IsSimulatedHost();
 const std::string& HostRoot();
 
 // Maps an absolute host path ("/bin/hrm-cmd", "/var/run/velk.pid") to the
-// path to use. Identity on a real host; inside the host root on a simulated
+// path to use: on a Debian host where Debian keeps it (the host tools in
+// /usr/libexec/velk, see linux/LinuxPaths.hpp); inside the host root on a simulated
 // one. Relative paths and empty text come back unchanged.
 std::string HostPath(const std::string& absolutePath);
 
@@ -51,7 +52,8 @@ void VSyslog(int priority, const char* format, va_list args);
 // the text goes to a temporary file in the same folder, which is flushed to
 // disk and renamed over `path`, and the folder is flushed too. Readers see
 // the old file or the new one, never a part; after a failure (or a kill) the
-// old file is still there. Throws HostCtlException naming the file.
+// old file is still there. A file that is a mount point of its own is
+// rewritten in place instead. Throws HostCtlException naming the file.
 void ReplaceFile(const std::string& path, const std::string& text, mode_t mode);
 
 // The time now as "2026-11-23T08:15:02.345Z" (UTC, milliseconds), the stamp

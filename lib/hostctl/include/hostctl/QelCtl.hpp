@@ -120,6 +120,10 @@ public:
     void SetQelIpv6Enabled(bool enabled);
     // Names of the host kernel's virtual NICs.
     std::vector<std::string> GetVirtualNicNames();
+    // The network changes made between these two calls reach the host as
+    // one change; CommitChange throws when the host could not apply them.
+    void BeginChange();
+    void CommitChange();
 
     // The factory restore of the network, in this order: the network core
     // dump sender lets go of the management interface, the whole network

@@ -16,20 +16,20 @@ struct LinkInfo {
     // The rtnetlink link kind: "bridge", "bond", "vlan", "veth", "tun",
     // "macvlan", ...; "" for a plain device (a physical NIC has none).
     std::string kind;
-    std::string mac;           // "52:54:00:12:34:56", "" when the link has none
-    bool adminUp = false;      // IFF_UP
-    bool carrier = false;      // IFF_LOWER_UP
-    int masterIndex = 0;       // the bridge or bond this link is a port or slave of; 0 for none
-    int parentIndex = 0;       // a VLAN's lower link; 0 for none
-    int vlanId = 0;            // a VLAN link's id
-    bool hasDevice = false;    // sysfs "device" link: a NIC with hardware behind it
-    std::string driver;        // sysfs device/driver's name, "" without a device
-    int speedMbps = 0;         // sysfs "speed"; 0 when unknown or no link
-    std::string duplex;        // sysfs "duplex": "full", "half" or ""
-    std::string bondPrimary;   // a bond's primary slave's name ("" when none)
-    std::string bondMode;      // a bond's mode ("active-backup", "802.3ad", ...)
-    std::string description;   // udev ID_MODEL_FROM_DATABASE or similar, "" when unknown
-    std::string label;         // SMBIOS/ACPI label (sysfs device/label), "" when none
+    std::string mac;          // "52:54:00:12:34:56", "" when the link has none
+    bool adminUp = false;     // IFF_UP
+    bool carrier = false;     // IFF_LOWER_UP
+    int masterIndex = 0;      // the bridge or bond this link is a port or slave of; 0 for none
+    int parentIndex = 0;      // a VLAN's lower link; 0 for none
+    int vlanId = 0;           // a VLAN link's id
+    bool hasDevice = false;   // sysfs "device" link: a NIC with hardware behind it
+    std::string driver;       // sysfs device/driver's name, "" without a device
+    int speedMbps = 0;        // sysfs "speed"; 0 when unknown or no link
+    std::string duplex;       // sysfs "duplex": "full", "half" or ""
+    std::string bondPrimary;  // a bond's primary slave's name ("" when none)
+    std::string bondMode;     // a bond's mode ("active-backup", "802.3ad", ...)
+    std::string description;  // udev ID_MODEL_FROM_DATABASE or similar, "" when unknown
+    std::string label;        // SMBIOS/ACPI label (sysfs device/label), "" when none
 };
 
 struct AddressInfo {
@@ -39,9 +39,9 @@ struct AddressInfo {
     int prefixLength = 0;
     // IFA_F_* flags of the address.
     uint32_t flags = 0;
-    bool Permanent() const;   // IFA_F_PERMANENT: configured, not learned
-    bool Tentative() const;   // IFA_F_TENTATIVE: duplicate detection not done
-    bool DadFailed() const;   // IFA_F_DADFAILED
+    bool Permanent() const;                // IFA_F_PERMANENT: configured, not learned
+    bool Tentative() const;                // IFA_F_TENTATIVE: duplicate detection not done
+    bool DadFailed() const;                // IFA_F_DADFAILED
     uint32_t validLifetime = 0xffffffffu;  // seconds; 0xffffffff: forever
     // IFA_PROTO: who made the address (IFAPROT_KERNEL_RA for one made from a
     // router advertisement, IFAPROT_KERNEL_LL for the link-local one); 0

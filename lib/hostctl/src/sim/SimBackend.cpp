@@ -2,8 +2,6 @@
 // host's state file through SimState, so that all processes working on the
 // host see one state.
 #include <fcntl.h>
-#include <spawn.h>
-#include <sys/wait.h>
 #include <syslog.h>
 #include <unistd.h>
 
@@ -16,6 +14,7 @@
 #include <stdexcept>
 #include <utility>
 
+#include "HostShell.hpp"
 #include "SimNetworkModel.hpp"
 #include "hostctl/Backend.hpp"
 #include "hostctl/Host.hpp"
@@ -787,7 +786,7 @@ public:
     // state's lock, since the host's tools change the state themselves.
     int RunCommandLine(const std::string& commandLine, bool logOutput, bool wait) override {
         Writing("RunCommandLine", [](json&) {}, {commandLine, logOutput, wait});
-        return RunOnHost(_sim.Root(), commandLine, logOutput, wait);
+        return RunHostShell(commandLine, logOutput, wait);
     }
 
 private:
@@ -795,103 +794,6 @@ private:
         if (!_sim.Object(s, "/firewall/rulesets").contains(id))
             throw _sim.Error("no firewall ruleset \"" + id + "\"");
         return "/firewall/rulesets/" + PointerStep(id) + "/enabled";
-    }
-
-    // The command line as the host's shell on `root` must see it: every word
-    // outside quotes that starts with "/" is a host path and gets the root
-    // in front ("/bin/sh /sbin/services.sh stop" runs the host's script),
-    // except the null device.
-    static std::string HostCommandLine(const std::string& root, const std::string& line) {
-        std::string quotedRoot = "'";
-        for (char c : root) quotedRoot += c == '\'' ? std::string("'\\''") : std::string(1, c);
-        quotedRoot += "'";
-        std::string out;
-        char quote = 0;
-        bool wordStart = true;
-        for (size_t i = 0; i < line.size(); ++i) {
-            const char c = line[i];
-            if (quote == 0 && wordStart && c == '/' && line.compare(i, 5, "/dev/") != 0) out += quotedRoot;
-            out += c;
-            if (quote != 0) {
-                if (c == quote) quote = 0;
-                wordStart = false;
-            } else if (c == '\'' || c == '"') {
-                quote = c;
-                wordStart = false;
-            } else {
-                wordStart = std::strchr(" \t\n;|&()<>", c) != nullptr;
-            }
-        }
-        return out;
-    }
-
-    static int RunOnHost(const std::string& root, const std::string& commandLine, bool logOutput, bool wait) {
-        std::string line = HostCommandLine(root, commandLine);
-        // A command that is not waited for runs in a background job of a
-        // shell that ends at once, so nothing is left to reap.
-        if (!wait) line = "(" + line + ") &";
-        const bool capture = logOutput && wait;
-        int fds[2] = {-1, -1};
-        if (capture && pipe2(fds, O_CLOEXEC) != 0)
-            throw HostCtlException(std::string("cannot create a pipe: ") + std::strerror(errno));
-
-        posix_spawn_file_actions_t actions;
-        posix_spawn_file_actions_init(&actions);
-        posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-        if (capture)
-            posix_spawn_file_actions_adddup2(&actions, fds[1], 1);
-        else
-            posix_spawn_file_actions_addopen(&actions, 1, "/dev/null", O_WRONLY, 0);
-        posix_spawn_file_actions_adddup2(&actions, 1, 2);
-        posix_spawn_file_actions_addclosefrom_np(&actions, 3);
-        // The caller may block signals (the console does, in every thread);
-        // the command starts with none blocked and default dispositions.
-        posix_spawnattr_t attr;
-        posix_spawnattr_init(&attr);
-        sigset_t none, defaults;
-        sigemptyset(&none);
-        sigemptyset(&defaults);
-        for (int sig : {SIGPIPE, SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGCHLD})
-            sigaddset(&defaults, sig);
-        posix_spawnattr_setsigmask(&attr, &none);
-        posix_spawnattr_setsigdefault(&attr, &defaults);
-        posix_spawnattr_setflags(&attr, POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
-
-        const std::string shell = root + "/bin/sh";
-        const std::string path = "PATH=" + root + "/sbin:" + root + "/bin";
-        const char* const argv[] = {"sh", "-c", line.c_str(), nullptr};
-        const char* const env[] = {"PYTHONHOME=/", path.c_str(), nullptr};
-        pid_t pid = -1;
-        const int rc = posix_spawn(&pid, shell.c_str(), &actions, &attr, const_cast<char* const*>(argv),
-                                   const_cast<char* const*>(env));
-        posix_spawn_file_actions_destroy(&actions);
-        posix_spawnattr_destroy(&attr);
-        if (capture) close(fds[1]);
-        if (rc != 0) {
-            if (capture) close(fds[0]);
-            throw HostCtlException("cannot run the host's shell " + shell + ": " + std::strerror(rc));
-        }
-        if (capture) {
-            std::string pending;
-            char buf[4096];
-            for (;;) {
-                const ssize_t n = read(fds[0], buf, sizeof buf);
-                if (n < 0 && errno == EINTR) continue;
-                if (n <= 0) break;
-                pending.append(buf, size_t(n));
-                for (size_t end; (end = pending.find('\n')) != std::string::npos; pending.erase(0, end + 1))
-                    Syslog(LOG_INFO, "%s", pending.substr(0, end).c_str());
-            }
-            if (!pending.empty()) Syslog(LOG_INFO, "%s", pending.c_str());
-            close(fds[0]);
-        }
-        int status = 0;
-        while (waitpid(pid, &status, 0) < 0) {
-            if (errno != EINTR)
-                throw HostCtlException(std::string("waiting for the shell: ") + std::strerror(errno));
-        }
-        if (WIFEXITED(status)) return WEXITSTATUS(status);
-        return WIFSIGNALED(status) ? 128 + WTERMSIG(status) : -1;
     }
 
     // Runs `read` on the latest state, unless a fault is set for `operation`.
