@@ -136,14 +136,16 @@ private:
 // The configuration as ifupdown reads it: a file and every file its "source"
 // and "source-directory" lines include, depth first, in the order ifupdown
 // reads them. Paths are host paths ("/etc/network/interfaces.d/vmbr0"),
-// read through HostPath. Missing or unreadable files and loops are skipped.
+// read through HostPath. Missing or unreadable files and loops are skipped
+// (no files at all when the first one is missing). Edit a file through
+// Files()[i].file, then write each of Changes() (ReplaceFile keeps the mode).
 class InterfacesFiles {
 public:
     struct File {
-        std::string path;    // absolute host path
-        mode_t mode = 0644;  // permission bits when read
-        std::string original;
-        InterfacesFile file;
+        std::string path;      // absolute host path
+        mode_t mode = 0644;    // permission bits when read
+        std::string original;  // the text as read
+        InterfacesFile file;   // the text with the edits made so far
     };
     struct Place {
         size_t file;
@@ -155,6 +157,7 @@ public:
         mode_t mode;
     };
 
+    // Reads `path` (an absolute host path) and what it includes.
     explicit InterfacesFiles(const std::string& path = "/etc/network/interfaces");
 
     std::vector<File>& Files() { return _files; }
