@@ -2,7 +2,7 @@
 # Builds the libFuzzer targets (fuzz/) with clang-14, AddressSanitizer and
 # UndefinedBehaviorSanitizer in build-fuzz, then runs each for SECONDS
 # (default 20) on its committed seeds plus what earlier runs found.
-#   scripts/fuzz.sh [SECONDS] [TARGET...]     TARGET: markup address state keys texts dns
+#   scripts/fuzz.sh [SECONDS] [TARGET...]     TARGET: markup address state keys texts dns interfaces
 # A failing target leaves its input in build-fuzz/crashes/ and its output in
 # build-fuzz/logs/; the script goes on with the others and fails at the end.
 set -euo pipefail
@@ -10,7 +10,7 @@ here="$(cd "$(dirname "$0")/.." && pwd)"
 cd "$here"
 seconds="${1:-20}"
 if [ $# -gt 0 ]; then shift; fi
-all=(markup address state keys texts dns)
+all=(markup address state keys texts dns interfaces)
 targets=("$@")
 if [ ${#targets[@]} -eq 0 ]; then targets=("${all[@]}"); fi
 
