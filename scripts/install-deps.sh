@@ -12,6 +12,11 @@ packages=(
   openssl openssh-client less
   scdoc
   clang-14 libclang-rt-14-dev
+  libnl-route-3-dev
+  # The network namespace tests: ifupdown and its bridge hooks, a DHCP client,
+  # the LAN's DHCP/RA/DNS server, and the tools the checks use.
+  ifupdown isc-dhcp-client dnsmasq-base bridge-utils
+  iputils-ping iputils-arping ndisc6 iproute2
 )
 
 missing=()

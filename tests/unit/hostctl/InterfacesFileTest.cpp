@@ -7,6 +7,7 @@
 
 #include "TestSupport.hpp"
 #include "linux/InterfacesFile.hpp"
+#include "linux/NetworkApply.hpp"
 
 namespace {
 
@@ -304,6 +305,87 @@ TEST_F(InterfacesFilesTest, FindsTheStanzaWhereItIsAndEditsThatFile) {
 
     std::filesystem::remove(Root() + "/etc/network/interfaces");
     EXPECT_TRUE(InterfacesFiles().Files().empty());
+}
+
+// A change of the management interface edits only the options Velk owns in
+// its stanzas (and makes every bridge keep its VM ports on ifupdown2).
+TEST_F(InterfacesFilesTest, ManagementChangesEditOnlyOwnedOptions) {
+    using HostCtl::Lib::Linux::Engine;
+    using HostCtl::Lib::Linux::PendingChange;
+    using HostCtl::Network::IpConfig;
+    using HostCtl::Network::Ipv4Address;
+    using HostCtl::Network::Ipv6Network;
+    auto ip = [](const std::string& v4, const std::string& v6 = "", bool ra = false) {
+        IpConfig c;
+        if (v4 == "dhcp")
+            c.SetUseDhcp(true);
+        else
+            c.SetUseDhcp(false, false, Ipv4Address(v4), Ipv4Address("255.255.255.0"));
+        if (!v6.empty()) c.SetIpv6Network({Ipv6Network(v6)});
+        c.SetUseIpv6RouterAdvertised(ra);
+        return c;
+    };
+    const std::string head = "auto lo\niface lo inet loopback\n\nauto vmbr0\n";
+    struct Row {
+        const char* what;
+        Engine engine;
+        std::string before;
+        std::function<void(PendingChange&)> change;
+        std::string after;  // "" when the change is refused
+    } rows[] = {
+        {"static address, gateway kept", Engine::Ifupdown,
+         head + "iface vmbr0 inet static\n\taddress 192.0.2.10\n\tnetmask 255.255.255.0 # old style\n"
+                "\tgateway 192.0.2.1\n\tbridge-ports eno1 # the NIC\n",
+         [&](PendingChange& c) { c.ip = ip("192.0.2.20"); },
+         head + "iface vmbr0 inet static\n\taddress 192.0.2.20/24\n\tgateway 192.0.2.1\n"
+                "\tbridge-ports eno1 # the NIC\n"},
+        {"DHCP drops the static options", Engine::Ifupdown,
+         head + "iface vmbr0 inet static\n    address 192.0.2.10/24\n    gateway 192.0.2.1\n    bridge-fd 0\n",
+         [&](PendingChange& c) { c.ip = ip("dhcp"); }, head + "iface vmbr0 inet dhcp\n    bridge-fd 0\n"},
+        {"static from DHCP with a gateway", Engine::Ifupdown, head + "iface vmbr0 inet dhcp\n    bridge-fd 0\n",
+         [&](PendingChange& c) {
+             c.ip = ip("192.0.2.20");
+             c.gateway4 = "192.0.2.1";
+         },
+         head + "iface vmbr0 inet static\n    bridge-fd 0\n    address 192.0.2.20/24\n    gateway 192.0.2.1\n"},
+        {"SLAAC on ifupdown: inet6 auto", Engine::Ifupdown, head + "iface vmbr0 inet dhcp\n",
+         [&](PendingChange& c) { c.ip = ip("dhcp", "", true); },
+         head + "iface vmbr0 inet dhcp\n\niface vmbr0 inet6 auto\n"},
+        {"static IPv6 with SLAAC on ifupdown2; both bridges keep VM ports", Engine::Ifupdown2,
+         head + "iface vmbr0 inet dhcp\n\tbridge-ports eno1\n\nauto vmbr1\niface vmbr1\n\tbridge-ports none\n",
+         [&](PendingChange& c) { c.ip = ip("dhcp", "2001:db8:1::10/64", true); },
+         head +
+             "iface vmbr0 inet dhcp\n\tbridge-ports eno1\n\tbridge-ports-condone-regex ^(tap|veth|fwpr|vnet)\n"
+             "\niface vmbr0 inet6 static\n\taddress 2001:db8:1::10/64\n\taccept_ra 2\n\tautoconf 1\n"
+             "\nauto vmbr1\niface vmbr1\n\tbridge-ports none\n\tbridge-ports-condone-regex ^(tap|veth|fwpr|vnet)\n"},
+        {"uplinks of a bond port", Engine::Ifupdown,
+         head + "iface vmbr0 inet dhcp\n\tbridge-ports bond0\n\nauto bond0\niface bond0 inet manual\n"
+                "\tbond-slaves eno1 eno2\n\tbond-primary eno1\n",
+         [&](PendingChange& c) {
+             c.uplinks = {"eno2", "eno1"};
+             c.primary = "eno2";
+         },
+         head + "iface vmbr0 inet dhcp\n\tbridge-ports bond0\n\nauto bond0\niface bond0 inet manual\n"
+                "\tbond-slaves eno2 eno1\n\tbond-primary eno2\n"},
+        {"DHCP on a stanza without a family is refused", Engine::Ifupdown2,
+         head + "iface vmbr0\n\taddress 192.0.2.10/24\n", [&](PendingChange& c) { c.ip = ip("dhcp"); }, ""},
+        {"a gateway without a static address is refused", Engine::Ifupdown, head + "iface vmbr0 inet dhcp\n",
+         [&](PendingChange& c) { c.gateway4 = "192.0.2.1"; }, ""},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.what);
+        Put("/etc/network/interfaces", row.before);
+        InterfacesFiles files;
+        PendingChange change;
+        change.iface = "vmbr0";
+        row.change(change);
+        if (row.after.empty()) {
+            EXPECT_THROW(HostCtl::Lib::Linux::EditForChange(files, change, row.engine), HostCtlException);
+            continue;
+        }
+        HostCtl::Lib::Linux::EditForChange(files, change, row.engine);
+        EXPECT_EQ(files.Files().at(0).file.Print(), row.after);
+    }
 }
 
 }  // namespace

@@ -39,10 +39,11 @@ struct AddressInfo {
     int prefixLength = 0;
     // IFA_F_* flags of the address.
     uint32_t flags = 0;
-    bool Permanent() const;                // IFA_F_PERMANENT: configured, not learned
-    bool Tentative() const;                // IFA_F_TENTATIVE: duplicate detection not done
-    bool DadFailed() const;                // IFA_F_DADFAILED
-    uint32_t validLifetime = 0xffffffffu;  // seconds; 0xffffffff: forever
+    bool Permanent() const;                    // IFA_F_PERMANENT: configured, not learned
+    bool Tentative() const;                    // IFA_F_TENTATIVE: duplicate detection not done
+    bool DadFailed() const;                    // IFA_F_DADFAILED
+    uint32_t validLifetime = 0xffffffffu;      // seconds left; 0xffffffff: forever
+    uint32_t preferredLifetime = 0xffffffffu;  // seconds left; 0 once deprecated
     // IFA_PROTO: who made the address (IFAPROT_KERNEL_RA for one made from a
     // router advertisement, IFAPROT_KERNEL_LL for the link-local one); 0
     // when the kernel does not say.
@@ -56,21 +57,27 @@ struct RouteInfo {
     int prefixLength = 0;  // 0 for a default route
     std::string destination;
     uint8_t protocol = 0;  // RTPROT_*: RTPROT_RA for a router-advertised route, RTPROT_DHCP ...
+    uint32_t metric = 0;   // RTA_PRIORITY; among routes to one destination the lowest wins
 };
 
 struct NetworkSnapshot {
     std::vector<LinkInfo> links;
     std::vector<AddressInfo> addresses;
-    std::vector<RouteInfo> routes;  // the main table's routes
+    // The main table's unicast routes, one entry per next hop of a
+    // multipath route.
+    std::vector<RouteInfo> routes;
 
     const LinkInfo* FindLink(const std::string& name) const;
     const LinkInfo* FindLink(int index) const;
     std::vector<const AddressInfo*> AddressesOf(int linkIndex) const;
+    // The default route of the family with the lowest metric; nothing when
+    // there is none.
     std::optional<RouteInfo> DefaultRoute(bool ipv6) const;
 };
 
 // Reads the network namespace the process runs in. Throws HostCtlException
-// when rtnetlink cannot be asked.
+// when rtnetlink cannot be asked; a sysfs or udev file that cannot be read
+// leaves its field empty.
 NetworkSnapshot ReadNetwork();
 
 }  // namespace HostCtl::Lib::Linux
