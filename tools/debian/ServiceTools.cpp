@@ -20,7 +20,13 @@ using HostCtl::Lib::Linux::OptionFile;
 
 namespace {
 
-std::string ShellTty() { return HostConfig::Load().shellTty; }
+// Read once per run: a tool that asks twice logs the file's problems once.
+const HostConfig& Config() {
+    static const HostConfig config = HostConfig::Load();
+    return config;
+}
+
+std::string ShellTty() { return Config().shellTty; }
 
 std::string GettyUnit(const std::string& tty) { return "getty@" + tty + ".service"; }
 
@@ -145,7 +151,7 @@ int ServicesScript(const Args& args) {
         Complain("Usage: services.sh {start|stop|restart}\n");
         return 1;
     }
-    std::vector<std::string> services = HostConfig::Load().agentServices;
+    std::vector<std::string> services = Config().agentServices;
     ServiceAction action = ServiceAction::Start;
     if (args[0] == "stop") {
         action = ServiceAction::Stop;
