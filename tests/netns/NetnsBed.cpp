@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <signal.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -75,13 +76,16 @@ struct Argv {
 };
 
 // Starts `argv` with standard input from /dev/null and both outputs into the
-// file `log` (appended); the process id.
+// file `log` (appended); the process id. It is killed when this program ends.
 pid_t Spawn(const std::vector<std::string>& argv, const std::string& log) {
     Argv args(argv), env(ChildEnvironment());
     const int out = open(log.c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0644);
     if (out < 0) throw std::runtime_error("cannot open " + log + ": " + std::strerror(errno));
     const pid_t pid = fork();
     if (pid == 0) {
+        // A test program killed before its teardown takes the anchor and
+        // dnsmasq with it.
+        prctl(PR_SET_PDEATHSIG, SIGKILL);
         const int in = open("/dev/null", O_RDONLY);
         dup2(in, 0);
         dup2(out, 1);
@@ -116,8 +120,9 @@ std::string UniqueName(const char* prefix) {
     return std::string(prefix) + std::to_string(getpid()) + "-" + std::to_string(g_counter++);
 }
 
-// Deletes the namespaces left by an earlier test program that died before
-// its teardown ("velk-h<pid>-<n>" whose pid has gone), once per program.
+// Deletes the namespaces and folders left by an earlier test program that
+// died before its teardown ("velk-h<pid>-<n>", "/tmp/velk-netns-<pid>.X"
+// whose pid has gone), once per program.
 void DropStaleNamespaces() {
     static bool done = false;
     if (done) return;
@@ -133,6 +138,14 @@ void DropStaleNamespaces() {
         const pid_t owner = static_cast<pid_t>(std::stol(digits));
         if (owner != getpid() && kill(owner, 0) != 0 && errno == ESRCH)
             RunCommand({"ip", "netns", "del", name});
+    }
+    std::error_code ec;
+    for (const auto& entry : fs::directory_iterator("/tmp", ec)) {
+        const std::string name = entry.path().filename();
+        if (name.rfind("velk-netns-", 0) != 0) continue;
+        const pid_t owner = static_cast<pid_t>(std::atol(name.c_str() + 11));
+        if (owner > 0 && owner != getpid() && kill(owner, 0) != 0 && errno == ESRCH)
+            fs::remove_all(entry.path(), ec);
     }
 }
 
@@ -294,7 +307,7 @@ void NetnsBed::Build() {
     Must({"ip", "netns", "add", _lan});
     _lanCreated = true;
 
-    std::string pattern = "/tmp/velk-netns.XXXXXX";
+    std::string pattern = "/tmp/velk-netns-" + std::to_string(getpid()) + ".XXXXXX";
     if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("mkdtemp failed");
     _dir = pattern;
     for (const char* sub :

@@ -198,22 +198,23 @@ struct Dump {
     bool failed = false;
 };
 
+// libnl calls back through C frames: no exception may leave the callback.
 void TakeObject(nl_object* obj, void* arg) {
     auto* dump = static_cast<Dump*>(arg);
-    dump->take(obj, dump->current);
+    if (dump->failed) return;
+    try {
+        dump->take(obj, dump->current);
+    } catch (...) {
+        dump->failed = true;
+    }
 }
 
 int OnDumpMessage(nl_msg* msg, void* arg) {
     auto* dump = static_cast<Dump*>(arg);
-    try {
-        dump->current = msg;
-        // A message libnl cannot parse (a family it does not know) is skipped.
-        nl_msg_parse(msg, TakeObject, dump);
-    } catch (...) {
-        dump->failed = true;
-        return NL_STOP;
-    }
-    return NL_OK;
+    dump->current = msg;
+    // A message libnl cannot parse (a family it does not know) is skipped.
+    nl_msg_parse(msg, TakeObject, dump);
+    return dump->failed ? NL_STOP : NL_OK;
 }
 
 template <typename Header>
