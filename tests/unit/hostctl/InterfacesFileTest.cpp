@@ -340,24 +340,29 @@ TEST_F(InterfacesFilesTest, ManagementChangesEditOnlyOwnedOptions) {
          head + "iface vmbr0 inet static\n\taddress 192.0.2.20/24\n\tgateway 192.0.2.1\n"
                 "\tbridge-ports eno1 # the NIC\n"},
         {"DHCP drops the static options", Engine::Ifupdown,
-         head + "iface vmbr0 inet static\n    address 192.0.2.10/24\n    gateway 192.0.2.1\n    bridge-fd 0\n",
+         head +
+             "iface vmbr0 inet static\n    address 192.0.2.10/24\n    gateway 192.0.2.1\n    bridge-fd 0\n",
          [&](PendingChange& c) { c.ip = ip("dhcp"); }, head + "iface vmbr0 inet dhcp\n    bridge-fd 0\n"},
-        {"static from DHCP with a gateway", Engine::Ifupdown, head + "iface vmbr0 inet dhcp\n    bridge-fd 0\n",
+        {"static from DHCP with a gateway", Engine::Ifupdown,
+         head + "iface vmbr0 inet dhcp\n    bridge-fd 0\n",
          [&](PendingChange& c) {
              c.ip = ip("192.0.2.20");
              c.gateway4 = "192.0.2.1";
          },
-         head + "iface vmbr0 inet static\n    bridge-fd 0\n    address 192.0.2.20/24\n    gateway 192.0.2.1\n"},
+         head +
+             "iface vmbr0 inet static\n    bridge-fd 0\n    address 192.0.2.20/24\n    gateway 192.0.2.1\n"},
         {"SLAAC on ifupdown: inet6 auto", Engine::Ifupdown, head + "iface vmbr0 inet dhcp\n",
          [&](PendingChange& c) { c.ip = ip("dhcp", "", true); },
          head + "iface vmbr0 inet dhcp\n\niface vmbr0 inet6 auto\n"},
         {"static IPv6 with SLAAC on ifupdown2; both bridges keep VM ports", Engine::Ifupdown2,
-         head + "iface vmbr0 inet dhcp\n\tbridge-ports eno1\n\nauto vmbr1\niface vmbr1\n\tbridge-ports none\n",
-         [&](PendingChange& c) { c.ip = ip("dhcp", "2001:db8:1::10/64", true); },
          head +
-             "iface vmbr0 inet dhcp\n\tbridge-ports eno1\n\tbridge-ports-condone-regex ^(tap|veth|fwpr|vnet)\n"
-             "\niface vmbr0 inet6 static\n\taddress 2001:db8:1::10/64\n\taccept_ra 2\n\tautoconf 1\n"
-             "\nauto vmbr1\niface vmbr1\n\tbridge-ports none\n\tbridge-ports-condone-regex ^(tap|veth|fwpr|vnet)\n"},
+             "iface vmbr0 inet dhcp\n\tbridge-ports eno1\n\nauto vmbr1\niface vmbr1\n\tbridge-ports none\n",
+         [&](PendingChange& c) { c.ip = ip("dhcp", "2001:db8:1::10/64", true); },
+         head + "iface vmbr0 inet dhcp\n\tbridge-ports eno1\n\tbridge-ports-condone-regex "
+                "^(tap|veth|fwpr|vnet)\n"
+                "\niface vmbr0 inet6 static\n\taddress 2001:db8:1::10/64\n\taccept_ra 2\n\tautoconf 1\n"
+                "\nauto vmbr1\niface vmbr1\n\tbridge-ports none\n\tbridge-ports-condone-regex "
+                "^(tap|veth|fwpr|vnet)\n"},
         {"uplinks of a bond port", Engine::Ifupdown,
          head + "iface vmbr0 inet dhcp\n\tbridge-ports bond0\n\nauto bond0\niface bond0 inet manual\n"
                 "\tbond-slaves eno1 eno2\n\tbond-primary eno1\n",

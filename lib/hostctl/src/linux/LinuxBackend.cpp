@@ -24,6 +24,7 @@
 #include "HostConfig.hpp"
 #include "HostShell.hpp"
 #include "LinkState.hpp"
+#include "LinuxPaths.hpp"
 #include "NetworkApply.hpp"
 #include "hostctl/Host.hpp"
 
@@ -426,8 +427,6 @@ private:
 
 class LinuxBackend : public Backend {
 public:
-    LinuxBackend() : _config(HostConfig::Load()) {}
-
     // Version and hardware.
 
     VersionRecord GetVersionRecord() override {
@@ -473,7 +472,7 @@ public:
     // Network, read from the running kernel.
 
     std::vector<Network::Pnic> GetPnics() override {
-        NetworkModel model(_config);
+        NetworkModel model(Configuration());
         std::vector<Network::Pnic> pnics;
         for (const LinkInfo* link : model.Nics()) {
             Network::Pnic pnic;
@@ -489,21 +488,23 @@ public:
         return pnics;
     }
 
-    std::string GetManagementInterfaceName() override { return NetworkModel(_config).ManagementInterface(); }
+    std::string GetManagementInterfaceName() override {
+        return NetworkModel(Configuration()).ManagementInterface();
+    }
 
     Network::IpConfig GetVnicIpConfig(const std::string& vnic) override {
-        return NetworkModel(_config).IpConfig(vnic);
+        return NetworkModel(Configuration()).IpConfig(vnic);
     }
 
     Network::ConnectionPoint GetVnicConnectionPoint(const std::string& vnic) override {
-        NetworkModel(_config).Link(vnic);  // an unknown interface throws
+        NetworkModel(Configuration()).Link(vnic);  // an unknown interface throws
         return Network::ConnectionPoint(Network::ConnectionPoint::PortGroup, vnic);
     }
 
-    std::vector<std::string> GetVnicNames() override { return NetworkModel(_config).VnicNames(); }
+    std::vector<std::string> GetVnicNames() override { return NetworkModel(Configuration()).VnicNames(); }
 
     std::string GetVnicMacAddress(const std::string& vnic) override {
-        return NetworkModel(_config).Link(vnic).mac;
+        return NetworkModel(Configuration()).Link(vnic).mac;
     }
 
     bool GetIpv6Enabled() override {
@@ -515,32 +516,34 @@ public:
     std::string GetConnectionPointSwitch(const Network::ConnectionPoint& point) override {
         if (point.GetType() != Network::ConnectionPoint::PortGroup)
             Refuse("finding a distributed port", NO_DVS);
-        return NetworkModel(_config).SwitchOf(point.GetName());
+        return NetworkModel(Configuration()).SwitchOf(point.GetName());
     }
 
-    std::vector<std::string> GetVirtualSwitchNames() override { return NetworkModel(_config).Switches(); }
+    std::vector<std::string> GetVirtualSwitchNames() override {
+        return NetworkModel(Configuration()).Switches();
+    }
 
     std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) override {
-        const Network::TeamingPolicy team = NetworkModel(_config).Team(vswitch);
+        const Network::TeamingPolicy team = NetworkModel(Configuration()).Team(vswitch);
         std::vector<std::string> all = team.activeUplinks;
         all.insert(all.end(), team.standbyUplinks.begin(), team.standbyUplinks.end());
         return all;
     }
 
     Network::TeamingPolicy GetTeamingPolicy(const std::string& vswitch) override {
-        return NetworkModel(_config).Team(vswitch);
+        return NetworkModel(Configuration()).Team(vswitch);
     }
 
     unsigned GetMaxActiveUplinks(const std::string& vswitch) override {
-        return NetworkModel(_config).MaxActive(vswitch);
+        return NetworkModel(Configuration()).MaxActive(vswitch);
     }
 
     std::vector<std::string> GetPortGroupNames(const std::string& vswitch) override {
-        return NetworkModel(_config).PortGroups(vswitch);
+        return NetworkModel(Configuration()).PortGroups(vswitch);
     }
 
     uint16_t GetPortGroupVlanId(const std::string& vswitch, const std::string& portGroup) override {
-        return NetworkModel(_config).PortGroupVlan(vswitch, portGroup);
+        return NetworkModel(Configuration()).PortGroupVlan(vswitch, portGroup);
     }
 
     std::vector<std::string> GetDistributedSwitchNames() override { return {}; }
@@ -580,7 +583,7 @@ public:
     }
 
     RouteSettings GetRouting(const std::string&) override {
-        NetworkModel model(_config);
+        NetworkModel model(Configuration());
         RouteSettings routes;
         if (auto r = model.Snapshot().DefaultRoute(false); r && Ipv4Address::IsValidAddress(r->gateway))
             routes.ipv4Gateway = Ipv4Address(r->gateway);
@@ -636,7 +639,7 @@ public:
             for (const auto* list : {&team.activeUplinks, &team.standbyUplinks})
                 if (std::find(list->begin(), list->end(), pnic) != list->end())
                     throw HostCtlException(pnic + " is already an uplink of " + vswitch);
-            NetworkModel model(_config);
+            NetworkModel model(Configuration());
             if (!model.IsNic(model.Link(pnic))) throw HostCtlException(pnic + " is not a physical NIC");
             (standby ? team.standbyUplinks : team.activeUplinks).push_back(pnic);
         });
@@ -671,7 +674,7 @@ public:
     void DisableNetDumper() override {}  // a Debian host has no network core dump sender to stop
     void ClearNetworkConfig() override { RefuseOnClusterNode("restoring the network"); }
     void AutoConfigNetwork() override {
-        NetworkModel model(_config);
+        NetworkModel model(Configuration());
         std::vector<std::string> nics;
         std::string uplink;
         for (const LinkInfo* nic : model.Nics()) {
@@ -699,7 +702,7 @@ public:
                             uint16_t vlan) override {
         // A VLAN interface is named after its VLAN ("vmbr0.10"): another VLAN
         // is another interface, with a stanza of its own.
-        if (NetworkModel(_config).PortGroupVlan(vswitch, portGroup) == vlan) return;
+        if (NetworkModel(Configuration()).PortGroupVlan(vswitch, portGroup) == vlan) return;
         Refuse("setting the management VLAN to " + std::to_string(vlan),
                "on a Debian host the VLAN is part of the interface's name (" + vswitch + "." +
                    std::to_string(vlan) + "); define that interface in /etc/network/interfaces");
@@ -766,7 +769,9 @@ public:
 
     // System.
 
-    std::string GetWelcomeMessage() override { return ReadText(_config.welcomeMessageFile).value_or(""); }
+    std::string GetWelcomeMessage() override {
+        return ReadText(Configuration().welcomeMessageFile).value_or("");
+    }
 
     std::string GetSystemAlert() override { return ReadText(ALERT_FILE).value_or(""); }
 
@@ -820,7 +825,17 @@ public:
         OptionFile::Set(name, {value.isInteger, value.integer, value.text});
     }
 
-    bool HasUserOption(const std::string&) override { return false; }
+    // A Debian host cannot reset its system configuration to defaults, as a
+    // host booted from the network cannot: it answers as such a host does,
+    // and the console offers no reset.
+    bool HasUserOption(const std::string& name) override {
+        if (name != "PXEBootEnabled") return false;
+        static std::once_flag logged;
+        std::call_once(logged, [] {
+            Syslog(LOG_INFO, "Resetting the system configuration is not available on a Debian host");
+        });
+        return true;
+    }
 
     // Smart cards: without the PC/SC daemon there is no reader to ask.
 
@@ -878,7 +893,7 @@ private:
         if (own) _pending.emplace();
         try {
             if (_pending->iface.empty())
-                _pending->iface = vnic.empty() ? NetworkModel(_config).ManagementInterface() : vnic;
+                _pending->iface = vnic.empty() ? NetworkModel(Configuration()).ManagementInterface() : vnic;
             if (_pending->iface.empty()) throw HostCtlException("this host has no management interface");
             if (!vnic.empty() && vnic != _pending->iface)
                 throw HostCtlException("one change set changes one interface (" + _pending->iface + ", not " +
@@ -894,7 +909,7 @@ private:
     // Changes the switch's uplinks, starting from the staged ones.
     template <typename Edit>
     void EditTeam(const std::string& vswitch, Edit edit) {
-        NetworkModel model(_config);
+        NetworkModel model(Configuration());
         Network::TeamingPolicy team = model.Team(vswitch);
         if (_pending && _pending->uplinks) {
             team.activeUplinks = *_pending->uplinks;
@@ -996,7 +1011,6 @@ private:
         ReplaceSystemFile("/etc/resolv.conf", out);
     }
 
-    HostConfig _config;
     std::optional<PendingChange> _pending;
 };
 

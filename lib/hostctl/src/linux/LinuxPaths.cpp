@@ -39,27 +39,35 @@ const std::map<std::string, std::string>& ToolPaths() {
     return tools;
 }
 
-const HostConfig& Config() {
+// True on the thread that is reading the configuration: the paths it reads
+// are the machine's own.
+thread_local bool loadingConfig = false;
+
+}  // namespace
+
+const HostConfig& Configuration() {
     // Read once: the mapping is asked for on every host path, and the
     // configuration only changes with a restart of the console.
     static std::once_flag once;
     static HostConfig* config = nullptr;
-    std::call_once(once, [] { config = new HostConfig(HostConfig::Load()); });
+    std::call_once(once, [] {
+        loadingConfig = true;
+        config = new HostConfig(HostConfig::Load());
+        loadingConfig = false;
+    });
     return *config;
 }
 
-}  // namespace
-
 std::string MapHostPath(const std::string& absolutePath) {
-    if (absolutePath == "/etc/velk/velk.conf") return absolutePath;  // read by Config() itself
+    if (loadingConfig) return absolutePath;
     const auto& tools = ToolPaths();
     if (auto it = tools.find(absolutePath); it != tools.end()) return it->second;
-    if (absolutePath == "/etc/zolva/ssl/rui.crt") return Config().certificate;
+    if (absolutePath == "/etc/zolva/ssl/rui.crt") return Configuration().certificate;
     // The console lets users log in while this marker exists. On Debian the
     // configuration decides: allowed maps to a folder that always exists,
     // refused to one that never does.
     if (absolutePath == "/var/run/zolva/show-velk-login")
-        return Config().consoleLogins ? "/" : "/run/velk/console-logins-are-off-in-velk.conf";
+        return Configuration().consoleLogins ? "/" : "/run/velk/console-logins-are-off-in-velk.conf";
     return absolutePath;
 }
 

@@ -15,4 +15,8 @@ inline constexpr const char* TOOLS_DIR = "/usr/libexec/velk";
 // are allowed, the hosts' log files to the Debian ones; other paths stay.
 std::string MapHostPath(const std::string& absolutePath);
 
+struct HostConfig;
+// The configuration ("/etc/velk/velk.conf"), read once, on first use.
+const HostConfig& Configuration();
+
 }  // namespace HostCtl::Lib::Linux
