@@ -97,6 +97,10 @@ public:
     void DisableNetDumper() override { Unavailable("disabling the network core dump sender"); }
     void ClearNetworkConfig() override { Unavailable("clearing the network configuration"); }
     void AutoConfigNetwork() override { Unavailable("configuring the network automatically"); }
+    std::string GetNetworkConfig() override { Unavailable("reading the network configuration"); }
+    void SetNetworkConfig(const std::string&) override {
+        Unavailable("putting back the network configuration");
+    }
     std::vector<Network::IpAddress> ResolveHostName(const std::string&) override {
         Unavailable("resolving a host name");
     }
