@@ -52,6 +52,10 @@ int DoRestoreNetworkDialog::Run() {
             powerOffFailed = true;
     }
 
+    // The configuration the clear removes, put back when the new one cannot
+    // be made: a failed restore leaves the host as it was, not without network.
+    std::string removed;
+    bool cleared = false;
     try {
         networkInfo.DisableNetDumper();
         if (powerOffFailed) {
@@ -59,8 +63,10 @@ int DoRestoreNetworkDialog::Run() {
             Syslog(LOG_ERR, "Error powering off VMs");
         } else {
             Log(std::string(_factory->GetString(210)) + " ");
+            removed = networkInfo.GetNetworkConfig();
             Syslog(LOG_INFO, "Clearing Network Config");
             networkInfo.ClearNetworkConfig();
+            cleared = true;
             Syslog(LOG_INFO, "Auto-Configuring Network");
             networkInfo.AutoConfigNetwork();
             Log(done);
@@ -68,6 +74,14 @@ int DoRestoreNetworkDialog::Run() {
     } catch (const HostCtl::Lib::HostCtlException&) {
         Log(failed);
         Syslog(LOG_ERR, "Error auto-configuring network");
+        if (cleared) {
+            Syslog(LOG_INFO, "Putting back the network configuration");
+            try {
+                networkInfo.SetNetworkConfig(removed);
+            } catch (const HostCtl::Lib::HostCtlException& e) {
+                Syslog(LOG_ERR, "Putting back the network configuration failed: %s", e.what());
+            }
+        }
     }
 
     SetFooter("{align:right}{color:black}<Enter>{/color}{color:dark-grey} OK{/color}{/align}");

@@ -161,7 +161,12 @@ int Frame::GetKey(bool useIdleTimeout) {
             case EV_TIMEOUT:
                 continue;
             case EV_REFRESH:
-                if (fgFrame) fgFrame->Update();
+                if (fgFrame) {
+                    // The same screen drawn again: keys typed meanwhile stay.
+                    Window::_keepTypeAhead = true;
+                    fgFrame->Update();
+                    Window::_keepTypeAhead = false;
+                }
                 CheckSmartCard();
                 continue;
             case EV_RESTART:
@@ -171,10 +176,9 @@ int Frame::GetKey(bool useIdleTimeout) {
                 }
                 exit(0);
             case EV_RESIZE:
-                ResizeTerminal();
-                exit(0);
             case EV_TERMINATE:
-                exit(0);
+            case EV_HANGUP:
+                End(result);
             case EV_CHILD:
                 ReapWatchedChildren();
                 if (_childExitHandler) return EV_CHILD;
@@ -182,10 +186,7 @@ int Frame::GetKey(bool useIdleTimeout) {
             default:
                 break;
         }
-        if (result == KEY_RESIZE) {
-            ResizeTerminal();
-            exit(0);
-        }
+        if (result == KEY_RESIZE) End(EV_RESIZE);
         if (result < 0) continue;
         if (dimmed) {
             clearok(curscr, TRUE);
@@ -197,6 +198,11 @@ int Frame::GetKey(bool useIdleTimeout) {
 }
 
 int Frame::WaitForInput(struct timeval* timeout) {
+    // An ending signal goes before whatever waits ahead of it in the pipe or
+    // on the keyboard (a flood of refresh requests). A restart requested while
+    // logged out ends the console too; once logged in, its byte marks it.
+    const int ending = endRequest.load();
+    if (ending != 0 && (ending != EV_RESTART || !_loggedIn)) return ending;
     fd_set fds;
     FD_ZERO(&fds);
     FD_SET(0, &fds);
@@ -216,11 +222,11 @@ int Frame::WaitForInput(struct timeval* timeout) {
             emptyReads = 0;
             return key;
         }
-        // A closed or hung-up terminal stays readable for ever: end like a
-        // hang-up instead of spinning on it.
-        if (EndOfInput()) {
-            Syslog(LOG_WARNING, "End of input on the terminal, exiting");
-            exit(0);
+        // A closed or hung-up terminal stays readable for ever: end instead
+        // of spinning on it.
+        if (const int end = EndOfInput()) {
+            if (end != EV_HANGUP) Syslog(LOG_WARNING, "End of input on the terminal, exiting");
+            End(end);
         }
         return EV_ERROR;
     }
@@ -230,7 +236,7 @@ int Frame::WaitForInput(struct timeval* timeout) {
         do {
             r = read(_signalPipe[0], &byte, 1);
         } while (r <= 0 && errno == EINTR);
-        if (r == 1 && byte >= 1 && byte <= 5) return -2 - byte;
+        if (r == 1 && byte >= 1 && byte <= 6) return -2 - byte;
     }
     return EV_ERROR;
 }
@@ -243,7 +249,9 @@ void Frame::StartSignalHandling() {
     sigemptyset(&_signalSet);
     // SIGCHLD too: a child's end reaches the key loop as a pipe byte, never as
     // an interruption somewhere else.
-    for (int sig : {SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGWINCH, SIGCHLD})
+    // SIGHUP: a hang-up of the terminal (a serial line without carrier, a
+    // closed pseudo-terminal) ends the console like the end of its input.
+    for (int sig : {SIGINT, SIGQUIT, SIGTERM, SIGUSR1, SIGUSR2, SIGWINCH, SIGCHLD, SIGHUP})
         sigaddset(&_signalSet, sig);
     if (pthread_sigmask(SIG_BLOCK, &_signalSet, nullptr) != 0) LogError("pthread_sigmask() failed");
     pthread_t thread;
@@ -285,6 +293,10 @@ void* Frame::SignalHandler(void*) {
                 byte = 4;
                 RequestEnd(EV_TERMINATE);
                 break;
+            case SIGHUP:
+                byte = 6;
+                RequestEnd(EV_HANGUP);
+                break;
             default:
                 continue;
         }
@@ -311,15 +323,17 @@ void Frame::RequestEnd(int event) {
     }
 }
 
-bool Frame::EndOfInput() {
+int Frame::EndOfInput() {
     struct pollfd input = {0, POLLIN, 0};
-    if (poll(&input, 1, 0) < 0) return false;
-    if (input.revents & (POLLHUP | POLLERR | POLLNVAL)) return true;
+    if (poll(&input, 1, 0) < 0) return 0;
+    // The hang-up signal may come after the hung-up terminal is seen here.
+    if (input.revents & POLLHUP) return EV_HANGUP;
+    if (input.revents & (POLLERR | POLLNVAL)) return EV_TERMINATE;
     if (!(input.revents & POLLIN)) {
         emptyReads = 0;
-        return false;
+        return 0;
     }
-    return ++emptyReads >= kEmptyReadsAtEnd;
+    return ++emptyReads >= kEmptyReadsAtEnd ? EV_TERMINATE : 0;
 }
 
 void Frame::SetForegroundChild(pid_t pid) {
@@ -332,8 +346,12 @@ bool Frame::EndRequested() { return endRequest.load() != 0; }
 
 void Frame::EndIfRequested() {
     const int event = endRequest.load();
-    if (event == 0) return;
+    if (event != 0) End(event);
+}
+
+void Frame::End(int event) {
     if (event == EV_RESIZE) ResizeTerminal();
+    if (event == EV_HANGUP) Syslog(LOG_WARNING, "Terminal hung up, exiting");
     exit(0);
 }
 
@@ -365,14 +383,14 @@ void Frame::RefuseSmallTerminal() {
         mvaddnstr(top + static_cast<int>(i), 0, rows[i].c_str(), COLS);
     refresh();
     for (;;) {
-        switch (WaitForInput(nullptr)) {
+        switch (const int event = WaitForInput(nullptr)) {
             case EV_TERMINATE:
             case EV_RESTART:
-                exit(0);
+            case EV_HANGUP:
+                End(event);
             case EV_RESIZE:
             case KEY_RESIZE:
-                ResizeTerminal();
-                exit(0);
+                End(EV_RESIZE);
             default:
                 break;  // keys and refreshes change nothing here
         }

@@ -77,7 +77,8 @@ public:
         EV_RESTART = -4,
         EV_RESIZE = -5,
         EV_TERMINATE = -6,
-        EV_CHILD = -7
+        EV_CHILD = -7,
+        EV_HANGUP = -8
     };
 
     static Frame* fgFrame;
@@ -93,8 +94,13 @@ public:
 
 private:
     static void RequestEnd(int event);
+    // Ends the console (status 0) for an ending event: a resize is adopted
+    // and logged, a hang-up logged.
+    [[noreturn]] static void End(int event);
     static void ArmEmergencyExit();
-    static bool EndOfInput();
+    // 0 while the terminal may still give keys; else the event that ends
+    // the console (EV_HANGUP for a hung-up terminal).
+    static int EndOfInput();
 
 protected:
     Frame* _parent;

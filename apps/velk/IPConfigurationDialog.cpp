@@ -21,7 +21,9 @@ IPConfigurationDialog::IPConfigurationDialog(Frame* parent, bool ipv4Off, bool i
       _gateway(gateway),
       _ipv4Off(ipv4Off),
       _ipv4Dhcp(ipv4Dhcp && !ipv4Off),
-      _ipv4Static(!ipv4Off && !ipv4Dhcp) {
+      _ipv4Static(!ipv4Off && !ipv4Dhcp),
+      _offAtStart(_ipv4Off),
+      _dhcpAtStart(_ipv4Dhcp) {
     const int choiceLabels[kChoices] = {103, 104, 105};
     const bool marked[kChoices] = {_ipv4Off, _ipv4Dhcp, _ipv4Static};
     for (int i = 0; i < kChoices; ++i)
@@ -95,10 +97,10 @@ void IPConfigurationDialog::Mark(int row) {
 bool IPConfigurationDialog::Accept() {
     if (!_ipv4Static) {
         // Off or DHCP: whatever the greyed rows hold is dropped, and so is
-        // the stored gateway.
+        // the stored gateway when the choice changed (a lease brings its own).
         _ipConfig.SetUseDhcp(_ipv4Dhcp);
         if (_ipv4Off) _ipConfig.SetIpv4UseNone();
-        _gateway = Ipv4Address();
+        if (_ipv4Off != _offAtStart || _ipv4Dhcp != _dhcpAtStart) _gateway = Ipv4Address();
         return true;
     }
     const std::string& address = _fields[ADDRESS_ROW - ADDRESS_ROW]->GetText();

@@ -61,6 +61,10 @@ private:
     bool _ipv4Off;
     bool _ipv4Dhcp;
     bool _ipv4Static;
+    // The choice marked when the dialog opened: confirming it again keeps the
+    // stored gateway.
+    const bool _offAtStart;
+    const bool _dhcpAtStart;
     RadioItem* _choices[kChoices];
     InputItem* _fields[kFields];
     ItemList* _list;

@@ -25,9 +25,69 @@ std::string Line(const char* text, const HostCtlException& e) { return std::stri
 
 void LogFailure(const char* text, const HostCtlException& e) { Syslog(LOG_ERR, "%s", Line(text, e).c_str()); }
 
+// The team of a standard switch as it was before a step changed it.
+struct TeamBefore {
+    std::string switchName;
+    HostCtl::Network::TeamingPolicy policy;
+};
+
+// Brings the team of `before.switchName` back to `before.policy`: the NICs
+// that still stand in their place (same role, same position) stay, the others
+// leave, and the missing ones are added back in their order and role.
+void PutBackTeam(const TeamBefore& before, const FailureReport& fail) {
+    VirtualSwitch vswitch(before.switchName);
+    HostCtl::Network::TeamingPolicy now;
+    try {
+        now = vswitch.GetTeamingPolicy();
+    } catch (const HostCtlException& e) {
+        fail(Line("Getting uplinks failed: ", e));
+        return;
+    }
+    const HostCtl::Network::TeamingPolicy& was = before.policy;
+    if (now.activeUplinks == was.activeUplinks && now.standbyUplinks == was.standbyUplinks) return;
+    std::string names;
+    for (const auto* list : {&was.activeUplinks, &was.standbyUplinks})
+        for (const std::string& nic : *list) names += " " + nic;
+    Syslog(LOG_INFO, "Putting back uplinks of %s:%s", before.switchName.c_str(), names.c_str());
+
+    auto inPlace = [](const std::vector<std::string>& now, const std::vector<std::string>& was) {
+        size_t n = 0;
+        while (n < now.size() && n < was.size() && now[n] == was[n]) ++n;
+        return n;
+    };
+    const size_t activeKept = inPlace(now.activeUplinks, was.activeUplinks);
+    const size_t standbyKept = inPlace(now.standbyUplinks, was.standbyUplinks);
+    std::vector<std::string> leaving(now.activeUplinks.begin() + static_cast<std::ptrdiff_t>(activeKept),
+                                     now.activeUplinks.end());
+    leaving.insert(leaving.end(), now.standbyUplinks.begin() + static_cast<std::ptrdiff_t>(standbyKept),
+                   now.standbyUplinks.end());
+    for (const std::string& nic : leaving) {
+        Syslog(LOG_INFO, "Removing uplink %s", nic.c_str());
+        try {
+            vswitch.RemoveUplinkFromTeamingPolicy(nic);
+        } catch (const HostCtlException& e) {
+            fail(Line("VS: remove uplink from teaming policy failed: ", e));
+        }
+    }
+    const std::pair<const std::vector<std::string>*, size_t> roles[] = {{&was.activeUplinks, activeKept},
+                                                                        {&was.standbyUplinks, standbyKept}};
+    for (const auto& [list, kept] : roles) {
+        for (size_t i = kept; i < list->size(); ++i) {
+            Syslog(LOG_INFO, "Adding uplink %s", (*list)[i].c_str());
+            try {
+                vswitch.AddUplinkToTeamingPolicy((*list)[i], list == &was.standbyUplinks);
+            } catch (const HostCtlException& e) {
+                fail(Line("VS: add uplink to teaming policy failed: ", e));
+            }
+        }
+    }
+}
+
 // Takes `nic` off every switch but `keep`: standard switches drop it from
-// their team, distributed switches free the uplink port it backs.
-void ReleaseFromOtherSwitches(const std::string& nic, const std::string& keep, const FailureReport& fail) {
+// their team (each switch's team is first noted in `touched`, once, so that
+// it can be put back), distributed switches free the uplink port it backs.
+void ReleaseFromOtherSwitches(const std::string& nic, const std::string& keep, const FailureReport& fail,
+                              std::vector<TeamBefore>& touched) {
     std::vector<std::string> vswitches;
     try {
         vswitches = QelCtl::Network::VirtualSwitchInfoImpl().GetVirtualSwitchNames();
@@ -42,6 +102,16 @@ void ReleaseFromOtherSwitches(const std::string& nic, const std::string& keep, c
         } catch (const HostCtlException& e) {
             fail(Line("Getting uplinks failed: ", e));
             continue;
+        }
+        // A team that could not be put back is not changed.
+        if (std::none_of(touched.begin(), touched.end(),
+                         [&](const TeamBefore& t) { return t.switchName == name; })) {
+            try {
+                touched.push_back({name, other.GetTeamingPolicy()});
+            } catch (const HostCtlException& e) {
+                fail(Line("Getting uplinks failed: ", e));
+                continue;
+            }
         }
         Syslog(LOG_INFO, "Removing uplink %s from %s", nic.c_str(), name.c_str());
         try {
@@ -209,9 +279,13 @@ void WriteTeam(const ManagementPort& port, HostCtl::Network::QelNic& mgmt,
         }
     }
 
+    // The first NIC the host refuses ends the step, which then puts back
+    // what it removed: the management switch keeps the uplinks it had.
+    std::vector<TeamBefore> touched;
+    bool refused = false;
     for (const std::string& nic : adapters) {
         if (Contains(team, nic)) continue;
-        ReleaseFromOtherSwitches(nic, port.switchName, fail);
+        ReleaseFromOtherSwitches(nic, port.switchName, fail, touched);
         Syslog(LOG_INFO, "Adding uplink %s", nic.c_str());
         // Without the limit, a NIC joins as active only when it is the first.
         bool standby = active > 0;
@@ -225,7 +299,15 @@ void WriteTeam(const ManagementPort& port, HostCtl::Network::QelNic& mgmt,
             if (!standby) ++active;
         } catch (const HostCtlException& e) {
             fail(Line("VS: add uplink to teaming policy failed: ", e));
+            refused = true;
+            break;
         }
+    }
+    if (refused) {
+        // The management switch first: it lets go of NICs the others take back.
+        PutBackTeam({port.switchName, policy}, fail);
+        for (const TeamBefore& other : touched) PutBackTeam(other, fail);
+        return;
     }
 
     if (!adapters.empty()) FollowFirstUplink(mgmt, adapters.front(), fail);

@@ -52,7 +52,8 @@ std::vector<Adapter> ReadAdapters();
 // that use them, then appended as active uplinks while the policy allows more
 // active ones, else as standby. Then, when the management interface carries
 // the MAC address of a former first uplink, it takes the new first uplink's.
-// Each failure goes to `fail`, and the rest goes on.
+// Each failure goes to `fail`, and the rest goes on; but when a NIC cannot be
+// added, the teams this call changed are put back as they were.
 void WriteTeam(const ManagementPort& port, HostCtl::Network::QelNic& mgmt,
                const std::vector<std::string>& adapters, const FailureReport& fail);
 

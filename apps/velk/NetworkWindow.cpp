@@ -537,6 +537,41 @@ void NetworkWindow::ApplyRenewal(bool vlanChanged) {
     }
 }
 
+std::string NetworkWindow::JoinServers(const std::vector<IpAddress>& servers) {
+    std::string list;
+    for (const IpAddress& server : servers) list += (list.empty() ? "" : " ") + server.GetStringAddress();
+    return list;
+}
+
+// The host's servers are read before they are removed, and put back when a
+// new one is refused: the host is never left without its name servers.
+void NetworkWindow::ApplyNameServers() {
+    Step("Setting nameservers to %s", JoinServers(_dnsServers).c_str());
+    std::vector<IpAddress> present;
+    try {
+        for (const auto& server : _dnsConfig.GetNameServers())
+            present.emplace_back(server.GetStringAddress());
+        for (const auto& server : _dnsConfig.GetIpv6NameServers())
+            present.emplace_back(server.GetStringAddress());
+        _dnsConfig.RemoveNameServers();
+    } catch (const HostCtlException& e) {
+        Fail(std::string("Setting DNS failed: ") + e.what());
+        return;
+    }
+    try {
+        for (size_t i = 0; i < _dnsServers.size() && i < 2; ++i) _dnsConfig.AddNameServer(_dnsServers[i]);
+    } catch (const HostCtlException& e) {
+        Fail(std::string("Setting DNS failed: ") + e.what());
+        Step("Putting back nameservers %s", JoinServers(present).c_str());
+        try {
+            _dnsConfig.RemoveNameServers();
+            for (const IpAddress& server : present) _dnsConfig.AddNameServer(server);
+        } catch (const HostCtlException& again) {
+            Fail(std::string("Putting back nameservers failed: ") + again.what());
+        }
+    }
+}
+
 void NetworkWindow::ApplyDns() {
     try {
         Step("Setting hostname to %s", _hostname.c_str());
@@ -550,18 +585,7 @@ void NetworkWindow::ApplyDns() {
 
     // Servers from DHCP arrived with the lease; those read at the start must
     // not replace them.
-    if (!(_ipConfig.GetDhcpDns() && DhcpInUse())) {
-        try {
-            std::string list;
-            for (const IpAddress& server : _dnsServers)
-                list += (list.empty() ? "" : " ") + server.GetStringAddress();
-            Step("Setting nameservers to %s", list.c_str());
-            _dnsConfig.RemoveNameServers();
-            for (size_t i = 0; i < _dnsServers.size() && i < 2; ++i) _dnsConfig.AddNameServer(_dnsServers[i]);
-        } catch (const HostCtlException& e) {
-            Fail(std::string("Setting DNS failed: ") + e.what());
-        }
-    }
+    if (!(_ipConfig.GetDhcpDns() && DhcpInUse())) ApplyNameServers();
 
     try {
         Step("Setting suffixes to %s", _suffixLine.c_str());

@@ -78,6 +78,8 @@ private:
     void ApplyGateways();
     void ApplyRenewal(bool vlanChanged);
     void ApplyDns();
+    void ApplyNameServers();
+    static std::string JoinServers(const std::vector<HostCtl::Network::IpAddress>& servers);
     bool DhcpInUse() const;
     std::string ScopedIpv6Gateway() const;
     // Logs a progress line and shows it on the status row.

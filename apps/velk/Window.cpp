@@ -10,6 +10,7 @@ namespace Velk {
 int Window::_xCursor = 0;
 int Window::_yCursor = 0;
 bool Window::_cursor = false;
+bool Window::_keepTypeAhead = false;
 
 Window::Window(int x, int y, int width, int height, int bg, int fg)
     : _win(newwin(height, width, y, x)), _x(x), _y(y), _width(width), _height(height), _bg(bg), _fg(fg) {}
@@ -65,7 +66,7 @@ void Window::Show(bool visible) {
         curs_set(_cursor ? 1 : 0);
         if (_cursor) move(_yCursor, _xCursor);
     }
-    flushinp();
+    if (!_keepTypeAhead) flushinp();
 }
 
 void Window::SetColors(int bg, int fg) {

@@ -21,7 +21,8 @@ public:
     Window& operator=(const Window&) = delete;
 
     // Visible windows are drawn in their colours, hidden ones dimmed (dark grey
-    // on black). Applies to every child, then refreshes. Drops type-ahead.
+    // on black). Applies to every child, then refreshes. Drops type-ahead,
+    // except while _keepTypeAhead is set.
     virtual void Show(bool visible);
 
     static Window* NewChild(Window* parent, int x, int y, int width, int height, int bg, int fg);
@@ -56,6 +57,9 @@ public:
     static int _xCursor;
     static int _yCursor;
     static bool _cursor;
+    // Set while a screen is drawn again as it is (a refresh): keys typed
+    // meanwhile are meant for that same screen.
+    static bool _keepTypeAhead;
 
 private:
     void ApplyBackground(int bg, int fg);

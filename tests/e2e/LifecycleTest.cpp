@@ -126,12 +126,16 @@ INSTANTIATE_TEST_SUITE_P(Args, VtArgumentTest,
                              return "arg_" + name + (info.param.valid ? "_valid" : "_invalid");
                          });
 
-// Ways the console ends with status 0 while nobody is logged in.
+// Ways the console ends with status 0 while nobody is logged in, each in
+// good time: well before the last-resort exit five seconds after the signal.
 struct EndCase {
     const char* name;
     const char* term;
     std::function<void(Terminal&)> act;
-    const char* resized;  // expected "Resized window to ..." size, or null: no such line
+    const char* resized;            // expected "Resized window to ..." size, or null: no such line
+    const char* logged = nullptr;   // another line it logs on the way out
+    const char* welcome = nullptr;  // a welcome text of the host, shown instead of its values
+    int withinMs = 4000;            // from the end of `act` to the exit
 };
 void PrintTo(const EndCase& c, std::ostream* os) { *os << c.name; }
 
@@ -140,10 +144,11 @@ class EndTest : public ::testing::TestWithParam<EndCase> {};
 TEST_P(EndTest, ExitsWithStatusZero) {
     const EndCase& c = GetParam();
     SimHost host;
+    if (c.welcome) host.Set("/system/welcomeMessage", c.welcome);
     Terminal t(host.Console(c.term, 80, 25));
-    ASSERT_TRUE(WaitForWelcome(t));
+    ASSERT_TRUE(c.welcome ? t.WaitForText(std::string(c.welcome, 20)) : WaitForWelcome(t));
     c.act(t);
-    ASSERT_TRUE(t.ExitsWith(0, Duration(5000)));
+    ASSERT_TRUE(t.ExitsWith(0, Duration(c.withinMs)));
     const auto resized = host.ConsoleLog("Resized window to ", t.Pid());
     if (c.resized) {
         ASSERT_EQ(resized.size(), 1u) << Joined(host.SyslogLines());
@@ -152,6 +157,27 @@ TEST_P(EndTest, ExitsWithStatusZero) {
     } else {
         EXPECT_TRUE(resized.empty()) << Joined(resized);
     }
+    if (c.logged) {
+        EXPECT_EQ(host.ConsoleLog(c.logged, t.Pid()).size(), 1u) << Joined(host.SyslogLines());
+    }
+}
+
+// Refresh requests queued before an ending signal do not hold it up: with a
+// long welcome text to lay out, a thousand take seconds.
+void RefreshFloodThen(Terminal& t, int sig) {
+    // Paced, so that each request reaches the console instead of merging
+    // with the one still pending.
+    for (int i = 0; i < 1000; ++i) {
+        t.Signal(SIGUSR1);
+        std::this_thread::sleep_for(std::chrono::microseconds(100));
+    }
+    t.Signal(sig);
+}
+const char* LongWelcome() {
+    static std::string text;
+    while (text.size() < 10000) text += "Property of the lab, ask Dana before rebooting. ";
+    text.resize(10000);
+    return text.c_str();
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -162,7 +188,12 @@ INSTANTIATE_TEST_SUITE_P(
                       EndCase{"PtyResized", "linux", [](Terminal& t) { t.Resize(100, 31); }, "100x31"},
                       EndCase{"SigwinchSameSize", "linux", [](Terminal& t) { t.Signal(SIGWINCH); }, "80x25"},
                       EndCase{"EscR", "linux", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"},
-                      EndCase{"EscRSerial", "vt100", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"}),
+                      EndCase{"EscRSerial", "vt100", [](Terminal& t) { t.Send("\x1bR"); }, "80x25"},
+                      EndCase{"WinchAfterRefreshFlood", "linux",
+                              [](Terminal& t) { RefreshFloodThen(t, SIGWINCH); }, "80x25", nullptr,
+                              LongWelcome(), 1500},
+                      EndCase{"PtyHangUp", "linux", [](Terminal& t) { t.HangUp(); }, nullptr,
+                              "user.warning: Terminal hung up, exiting"}),
     [](const auto& info) { return std::string(info.param.name); });
 
 }  // namespace

@@ -16,11 +16,14 @@ inline constexpr char kRebootQuestion[] = "Apply changes and reboot host?";
 inline constexpr char kErrorTitle[] = "Enable Management Network: Error";
 
 class NetworkTest : public ConsoleTest {
+public:
+    // The entries of the window in menu order.
+    enum Entry { kAdapters, kVlan, kIpv4, kIpv6, kDns, kSuffixes };
+
 protected:
     explicit NetworkTest(const std::string& network = "") : ConsoleTest(network) {}
 
-    // The entries of the window in menu order, each with a text its dialog shows.
-    enum Entry { kAdapters, kVlan, kIpv4, kIpv6, kDns, kSuffixes };
+    // Each entry with a text its dialog shows.
     struct EntryDialog {
         const char* entry;
         const char* shown;

@@ -18,18 +18,28 @@ using nlohmann::json;
     return t.WaitForTextGone(message);
 }
 
-TEST_F(StaticNetworkTest, ConfirmingEveryDialogUnchangedAsksNothingAndWritesNothing) {
+// On a static address and on a DHCP lease, whose gateway stays as it is.
+class UnchangedDialogsTest : public ::testing::WithParamInterface<const char*>, public NetworkTest {
+protected:
+    UnchangedDialogsTest() : NetworkTest(GetParam()) {}
+};
+
+TEST_P(UnchangedDialogsTest, ConfirmingEveryDialogUnchangedAsksNothingAndWritesNothing) {
     ASSERT_TRUE(OpenNetwork());
     for (const Entry entry : {kAdapters, kVlan, kIpv4, kIpv6, kDns, kSuffixes}) {
         ASSERT_TRUE(OpenDialog(entry));
         ASSERT_TRUE(Confirm(entry));
     }
+    ASSERT_TRUE(SelectEntry(*t, "IPv4 Configuration", true));
+    EXPECT_TRUE(t->Shows("Default Gateway: 192.0.2.1")) << t->Dump();
     t->SendKey("Esc");
     ASSERT_TRUE(WaitForMenu(*t));
     EXPECT_TRUE(NotLogged(host, "Setting"));
     EXPECT_TRUE(History(host, {"hostctl"}).empty()) << host.Get("/history").dump(1);
     for (const json& e : History(host, {"hrm-cmd"})) EXPECT_NE(e.value("command", ""), "internalsvc/refresh");
 }
+INSTANTIATE_TEST_SUITE_P(Hosts, UnchangedDialogsTest, ::testing::Values("static", ""),
+                         [](const auto& info) { return std::string(*info.param ? "Static" : "Dhcp"); });
 
 // The VLAN field's limits, then the question on leaving: Esc keeps every
 // edit, N drops them all.

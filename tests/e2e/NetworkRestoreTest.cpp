@@ -102,6 +102,10 @@ TEST_P(RunningVmsTest, WarnedFirstAndLoggedWhatever) {
         EXPECT_TRUE(WaitForLog(host, c.logged));
     }
 
+    // A refused restore leaves the network as it was.
+    if (*c.fault) {
+        EXPECT_EQ(host.Get("/network/vnics"), before);
+    }
     const std::vector<json> powerOff = History(host, {"powerOffVms"});
     if (std::string(c.warningKey) == "Esc") {
         EXPECT_TRUE(powerOff.empty());
@@ -118,6 +122,8 @@ const VmCase kVmCases[] = {
     {"DeclinedRestoresNothing", "Esc", "", "", ""},
     {"HostRefusesTheRestore", "Enter", "ClearNetworkConfig", "Auto-configuring network. Failed.",
      "user.err: Error auto-configuring network"},
+    {"HostRefusesTheNewNetwork", "Enter", "AutoConfigNetwork", "Auto-configuring network. Failed.",
+     "user.info: Putting back the network configuration"},
 };
 INSTANTIATE_TEST_SUITE_P(Cases, RunningVmsTest, ::testing::ValuesIn(kVmCases),
                          [](const auto& info) { return std::string(info.param.name); });

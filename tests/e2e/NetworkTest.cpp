@@ -168,5 +168,62 @@ const FaultCase kFaultCases[] = {
 INSTANTIATE_TEST_SUITE_P(Steps, NetworkFaultTest, ::testing::ValuesIn(kFaultCases),
                          [](const auto& info) { return std::string(info.param.name); });
 
+// A step that takes a value away before it adds the new one, refused the
+// addition: the step puts back what it removed, so the setting stays as it
+// was (the host keeps its uplink, its name server).
+struct RefusedAddition {
+    const char* name;
+    NetworkTest::Entry entry;
+    std::vector<std::string> keys;
+    const char* fault;    // an operation, with the argument whose calls fail
+    const char* kept;     // the state the step leaves as it was
+    const char* putBack;  // the log line of the put-back, or null: nothing was removed
+};
+void PrintTo(const RefusedAddition& c, std::ostream* os) { *os << c.name; }
+
+class RefusedAdditionTest : public StaticNetworkTest,
+                            public ::testing::WithParamInterface<RefusedAddition> {};
+
+TEST_P(RefusedAdditionTest, PutsBackWhatTheStepRemoved) {
+    const RefusedAddition& c = GetParam();
+    const json before = host.Get(c.kept);
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(Edit(c.entry, c.keys));
+    host.Fail(c.fault);
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitForText(kRestartQuestion));
+    t->Send("y");
+    ASSERT_TRUE(t->WaitForText(kErrorTitle));
+    t->SendKey("Enter");
+    ASSERT_TRUE(WaitForLog(host, "Network settings changed."));
+    EXPECT_EQ(host.Get(c.kept), before);
+    if (c.putBack) {
+        EXPECT_TRUE(LoggedOnce(host, c.putBack, t->Pid()));
+    }
+}
+
+const RefusedAddition kRefusedAdditions[] = {
+    {"AdapterReplaced",
+     NetworkTest::kAdapters,
+     {" ", "Down", " "},
+     "AddUplinkToTeamingPolicy zonic1",
+     "/network/vswitches/0",
+     "Putting back uplinks of kSwitch0: zonic0"},
+    {"NameServerReplaced",
+     NetworkTest::kDns,
+     {"Down", "198.51.100.53"},
+     "AddNameServer 198.51.100.53",
+     "/network/dns",
+     "Putting back nameservers 192.0.2.53"},
+    {"SuffixesReplaced",
+     NetworkTest::kSuffixes,
+     {"lab.test"},
+     "SetSearchDomains",
+     "/network/dns/searchDomains",
+     nullptr},
+};
+INSTANTIATE_TEST_SUITE_P(Steps, RefusedAdditionTest, ::testing::ValuesIn(kRefusedAdditions),
+                         [](const auto& info) { return std::string(info.param.name); });
+
 }  // namespace
 }  // namespace E2e

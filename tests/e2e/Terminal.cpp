@@ -201,13 +201,22 @@ Terminal::~Terminal() {
         kill(_pid, SIGKILL);
         Reap(0);
     }
+    HangUp();
+    vterm_free(_vt);
+}
+
+void Terminal::HangUp() {
     {
         std::lock_guard lock(_mutex);
+        if (_master < 0) return;
         _stop = true;
     }
     _reader.join();
+    std::lock_guard lock(_mutex);
     close(_master);
-    vterm_free(_vt);
+    _master = -1;
+    _eof = true;
+    _changed.notify_all();
 }
 
 void Terminal::ReaderLoop() {

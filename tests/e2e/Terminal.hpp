@@ -119,6 +119,9 @@ public:
     void Signal(int sig);
     // Sets the pty's size; the kernel signals SIGWINCH to the program.
     void Resize(int cols, int rows);
+    // Closes the master side, as a terminal emulator that goes away does: the
+    // kernel hangs up the program's terminal (SIGHUP). Output is no longer read.
+    void HangUp();
     // The pty's termios settings as the program left them.
     struct termios Modes() const;
 

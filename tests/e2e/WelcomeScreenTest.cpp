@@ -367,6 +367,24 @@ TEST(WelcomeScreenTest, CustomWelcomeMessageReplacesEverything) {
     EXPECT_TRUE(t.CellAt(10, 20).bg.IsIndex(3)) << t.Dump(true);
 }
 
+// A refresh redraws the same screen: a key typed while it runs is kept,
+// however long the redraw takes.
+TEST(WelcomeScreenTest, KeyTypedDuringARefreshIsKept) {
+    SimHost host;
+    std::string message;
+    while (message.size() < 10000) message += "Property of the lab, ask Dana before rebooting. ";
+    host.Set("/system/welcomeMessage", message.substr(0, 10000));
+    Terminal t(host.Console());
+    ASSERT_TRUE(t.WaitForText("Property of the lab"));
+    for (int round = 0; round < 6; ++round) {
+        t.Signal(SIGUSR1);
+        t.SendKey("F2");
+        ASSERT_TRUE(t.WaitForText("Login Name:", Duration(3000))) << "round " << round;
+        t.SendKey("Esc");
+        ASSERT_TRUE(t.WaitForTextGone("Login Name:"));
+    }
+}
+
 TEST(WelcomeScreenTest, OtherKeysAreIgnored) {
     SimHost host;
     Terminal t(host.Console());

@@ -1,7 +1,7 @@
 // velk-simhost: creates a simulated host and reads or changes its state.
 //   velk-simhost create ROOT [--hostname NAME] [--password P] [--network SHAPE[,SHAPE...]] [--force]
 //   velk-simhost boot ROOT
-//   velk-simhost fail ROOT OPERATION [MESSAGE | --clear]
+//   velk-simhost fail ROOT 'OPERATION [WORD]' [MESSAGE | --clear]
 //   velk-simhost fail ROOT 'TOOL [WORD]' [STDERR | --clear]
 //   velk-simhost slow ROOT 'TOOL [WORD]' SECONDS
 //   velk-simhost login ROOT
@@ -37,7 +37,7 @@ const char* const USAGE =
     "usage: velk-simhost create ROOT [--hostname NAME] [--password P] [--network SHAPE[,SHAPE...]] "
     "[--force]\n"
     "       velk-simhost boot ROOT\n"
-    "       velk-simhost fail ROOT OPERATION [MESSAGE | --clear]\n"
+    "       velk-simhost fail ROOT 'OPERATION [WORD]' [MESSAGE | --clear]\n"
     "       velk-simhost fail ROOT 'TOOL [WORD]' [STDERR | --clear]\n"
     "       velk-simhost slow ROOT 'TOOL [WORD]' SECONDS\n"
     "       velk-simhost login ROOT\n"
@@ -59,8 +59,10 @@ const char* const USAGE =
     "  interface configured anew from the simulated network; power state \"on\".\n"
     "fail: makes the host control operation OPERATION (a backend method name such as\n"
     "  SetVnicIpConfig or GetPnics) fail with MESSAGE (default \"simulated failure of\n"
-    "  OPERATION\") until cleared with --clear. With a host tool instead (hrm-cmd, TarnShell,\n"
-    "  SSH, tarncfg-advcfg, tarncli, localcli, services.sh, qelbacktrace, powerOffVms, reboot,\n"
+    "  OPERATION\") until cleared with --clear; with WORD, only the calls that have WORD\n"
+    "  among their arguments ('AddNameServer 198.51.100.53'). With a host tool instead\n"
+    "  (hrm-cmd, TarnShell, SSH, tarncfg-advcfg, tarncli, localcli, services.sh, qelbacktrace, powerOffVms, "
+    "reboot,\n"
     "  poweroff, firmwareConfig.sh, grabCIMData), every call of the tool, or with WORD every\n"
     "  call that has WORD among its arguments ('hrm-cmd hostsvc/start_ssh', 'services.sh stop'),\n"
     "  prints STDERR on its standard error and exits with status 1 without changing anything.\n"
@@ -170,7 +172,8 @@ int Fail(const std::vector<std::string>& args) {
     const std::string& operation = args[1];
     const std::vector<std::string>& known = HostCtl::Lib::SimulatedOperations();
     const bool tool = VelkTools::IsToolFaultName(operation);
-    if (!tool && std::find(known.begin(), known.end(), operation) == known.end()) {
+    const std::string named = operation.substr(0, operation.find(' '));
+    if (!tool && std::find(known.begin(), known.end(), named) == known.end()) {
         std::string list, tools;
         for (const std::string& name : known) list += (list.empty() ? "" : " ") + name;
         for (const std::string& name : VelkTools::ToolNames()) tools += (tools.empty() ? "" : " ") + name;

@@ -120,6 +120,10 @@ void NetworkInfoImpl::ClearNetworkConfig() { GetBackend().ClearNetworkConfig(); 
 
 void NetworkInfoImpl::AutoConfigNetwork() { GetBackend().AutoConfigNetwork(); }
 
+std::string NetworkInfoImpl::GetNetworkConfig() { return GetBackend().GetNetworkConfig(); }
+
+void NetworkInfoImpl::SetNetworkConfig(const std::string& config) { GetBackend().SetNetworkConfig(config); }
+
 namespace {
 
 bool IsValidLabel(const std::string& label) {

@@ -309,6 +309,8 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
         OP(DisableNetDumper),
         OP(ClearNetworkConfig),
         OP(AutoConfigNetwork),
+        OP(GetNetworkConfig),
+        OP(SetNetworkConfig, "{}"),
         OP(ResolveHostName, "www.example.test"),
         OP(GetDns, stack),
         OP(SetHostname, stack, "esx7", true),
@@ -372,6 +374,12 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
         Edit([&](json& s) { s["faults"] = {{name == "GetPnics" ? "GetDns" : "GetPnics", "elsewhere"}}; });
         EXPECT_NO_THROW(call(backend));
     }
+
+    // Named with an argument, a fault refuses only the calls with it.
+    Reset();
+    Edit([](json& s) { s["faults"] = {{"AddNameServer 192.0.2.9", "refused"}}; });
+    ExpectRefused([&] { backend.AddNameServer("defaultTcpipStack", IpAddress("192.0.2.9")); }, "refused");
+    EXPECT_NO_THROW(backend.AddNameServer("defaultTcpipStack", IpAddress("192.0.2.8")));
 
     Reset();
     Edit([](json& s) { s["faults"] = "GetPnics"; });

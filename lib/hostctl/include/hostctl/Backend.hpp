@@ -112,6 +112,9 @@ public:
     virtual void DisableNetDumper() = 0;
     virtual void ClearNetworkConfig() = 0;
     virtual void AutoConfigNetwork() = 0;
+    // What ClearNetworkConfig removes, as an opaque text, and its return.
+    virtual std::string GetNetworkConfig() = 0;
+    virtual void SetNetworkConfig(const std::string& config) = 0;
     // The host resolver's answer for `name`: hosts file, then name servers.
     virtual std::vector<Network::IpAddress> ResolveHostName(const std::string& name) = 0;
 

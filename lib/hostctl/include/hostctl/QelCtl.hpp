@@ -134,6 +134,11 @@ public:
     void DisableNetDumper();
     void ClearNetworkConfig();
     void AutoConfigNetwork();
+    // What ClearNetworkConfig removes (virtual NICs, switches, port groups,
+    // routes, name servers) as an opaque text, and its return: a restore
+    // whose new configuration cannot be made puts the old one back.
+    std::string GetNetworkConfig();
+    void SetNetworkConfig(const std::string& config);
 
 private:
     bool _updated = false;

@@ -21,6 +21,8 @@
 #include <set>
 #include <sstream>
 
+#include <nlohmann/json.hpp>
+
 #include "HostConfig.hpp"
 #include "HostShell.hpp"
 #include "LinkState.hpp"
@@ -686,6 +688,24 @@ public:
         std::string bridge = "vmbr0";
         if (!mgmt.empty() && model.Link(model.SwitchOf(mgmt)).kind == "bridge") bridge = model.SwitchOf(mgmt);
         ApplyFactoryLayout(mgmt, bridge, uplink, nics);
+    }
+
+    // The factory restore's way back: the files as they were, applied again
+    // to the interface that had the management address.
+    std::string GetNetworkConfig() override {
+        return nlohmann::json{{"iface", NetworkModel(Configuration()).ManagementInterface()}, {"files", SavedFiles()}}
+            .dump();
+    }
+    void SetNetworkConfig(const std::string& config) override {
+        std::string iface, files;
+        try {
+            const nlohmann::json saved = nlohmann::json::parse(config);
+            iface = saved.at("iface").get<std::string>();
+            files = saved.at("files").get<std::string>();
+        } catch (const nlohmann::json::exception& e) {
+            throw HostCtlException(std::string("putting back the network configuration: ") + e.what());
+        }
+        PutBackFiles(files, iface);
     }
 
     void SetVnicConnectionPoint(const std::string&, const Network::ConnectionPoint&) override {

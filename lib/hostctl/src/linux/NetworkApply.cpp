@@ -10,6 +10,8 @@
 #include <filesystem>
 #include <thread>
 
+#include <nlohmann/json.hpp>
+
 #include "HostShell.hpp"
 #include "LinkState.hpp"
 #include "hostctl/Host.hpp"
@@ -370,6 +372,28 @@ void ApplyFactoryLayout(const std::string& oldIface, const std::string& bridge, 
     lease.ip->SetUseDhcp(true);
     WaitFor(lease, DHCP_MS, what);
     Syslog(LOG_INFO, "Restored the network: %s on %s with DHCP", bridge.c_str(), uplink.c_str());
+}
+
+std::string SavedFiles() {
+    nlohmann::json files = nlohmann::json::array();
+    for (const auto& f : InterfacesFiles().Files())
+        files.push_back({{"path", f.path}, {"mode", f.mode}, {"text", f.original}});
+    return files.dump();
+}
+
+void PutBackFiles(const std::string& saved, const std::string& iface) {
+    nlohmann::json files;
+    try {
+        files = nlohmann::json::parse(saved);
+        for (const auto& f : files)
+            ReplaceFile(HostPath(f.at("path").get<std::string>()), f.at("text").get<std::string>(),
+                        f.at("mode").get<mode_t>());
+    } catch (const nlohmann::json::exception& e) {
+        throw HostCtlException(std::string("putting back the network configuration: not a saved configuration: ") +
+                               e.what());
+    }
+    SetInterfaceUp(iface, false);
+    SetInterfaceUp(iface, true);
 }
 
 void SetInterfaceUp(const std::string& iface, bool up) {

@@ -61,6 +61,12 @@ std::string FactoryLayout(const std::string& bridge, const std::string& uplink,
 void ApplyFactoryLayout(const std::string& oldIface, const std::string& bridge, const std::string& uplink,
                         const std::vector<std::string>& nics);
 
+// The interfaces files as they are now, as one text for PutBackFiles.
+std::string SavedFiles();
+// Writes the files of SavedFiles back as they were and has ifupdown apply
+// them to `iface` (bounded).
+void PutBackFiles(const std::string& saved, const std::string& iface);
+
 // Takes the interface down (its addresses and leases go; a bridge and its
 // ports stay) or brings it up again from its stanza, bounded.
 void SetInterfaceUp(const std::string& iface, bool up);

@@ -79,6 +79,8 @@ const std::vector<std::string> OPERATIONS = {
     "DisableNetDumper",
     "ClearNetworkConfig",
     "AutoConfigNetwork",
+    "GetNetworkConfig",
+    "SetNetworkConfig",
     "ResolveHostName",
     "GetDns",
     "SetHostname",
@@ -479,6 +481,42 @@ public:
         Writing("AutoConfigNetwork", [&](json& s) { NetworkModel(_sim, s).AutoConfig(); });
     }
 
+    // The fields ClearNetworkConfig changes, by JSON pointer.
+    static const std::vector<std::string>& NetworkConfigFields() {
+        static const std::vector<std::string> fields = {"/network/vnics",
+                                                        "/network/vswitches",
+                                                        "/network/dvswitches",
+                                                        "/network/managementInterface",
+                                                        "/network/routing",
+                                                        "/network/saved/routing",
+                                                        "/network/dns/servers",
+                                                        "/network/dns/ipv6Servers",
+                                                        "/network/saved/dns/servers",
+                                                        "/network/saved/dns/ipv6Servers"};
+        return fields;
+    }
+
+    std::string GetNetworkConfig() override {
+        return Reading("GetNetworkConfig", [&](const json& s) {
+            json config = json::object();
+            for (const std::string& field : NetworkConfigFields())
+                if (s.contains(json::json_pointer(field))) config[field] = s.at(json::json_pointer(field));
+            return config.dump();
+        });
+    }
+
+    void SetNetworkConfig(const std::string& text) override {
+        Writing("SetNetworkConfig", [&](json& s) {
+            const json config = json::parse(text, nullptr, false);
+            if (!config.is_object()) throw HostCtlException("not a network configuration of this host");
+            for (const auto& [field, value] : config.items()) {
+                if (std::ranges::find(NetworkConfigFields(), field) == NetworkConfigFields().end())
+                    throw HostCtlException("not a network configuration of this host: " + field);
+                s[json::json_pointer(field)] = value;
+            }
+        });
+    }
+
     // The simulated network answers; the machine's own resolver is never asked.
     std::vector<Network::IpAddress> ResolveHostName(const std::string& name) override {
         return Reading("ResolveHostName", [&](const json& s) { return NetworkView(_sim, s).Resolve(name); });
@@ -819,7 +857,7 @@ private:
         try {
             _sim.Update(
                 [&](json& s) {
-                    CheckFault(s, operation);
+                    CheckFault(s, operation, args);
                     hostname = DnsText(s, "hostname");
                     domain = DnsText(s, "domain");
                     entry = HostsFileEntry(s);
@@ -839,16 +877,22 @@ private:
         }
     }
 
-    void CheckFault(const json& s, const char* operation) const {
+    // A fault named by the operation and one of the call's arguments
+    // ("AddNameServer 198.51.100.53") applies to the calls with that argument
+    // only, and wins over one named by the operation alone.
+    void CheckFault(const json& s, const char* operation, const json& args = json::array()) const {
         if (!IsSimulatedOperation(operation))
             throw std::logic_error(std::string("unlisted operation ") + operation);
         const auto faults = s.find("faults");
         if (faults == s.end() || faults->is_null()) return;
         if (!faults->is_object()) throw _sim.Error("field /faults must be an object");
-        const auto fault = faults->find(operation);
+        auto fault = faults->end();
+        for (const json& arg : args)
+            if (arg.is_string() && fault == faults->end())
+                fault = faults->find(std::string(operation) + " " + arg.get<std::string>());
+        if (fault == faults->end()) fault = faults->find(operation);
         if (fault == faults->end()) return;
-        if (!fault->is_string())
-            throw _sim.Error(std::string("field /faults/") + operation + " must be a string");
+        if (!fault->is_string()) throw _sim.Error("field /faults/" + fault.key() + " must be a string");
         throw HostCtlException(fault->get<std::string>());
     }
 

@@ -108,7 +108,8 @@ bool WriteAll(int fd, const std::string& data) {
 //   switch "vswitch", management port group "portgroup" and interface "vnic".
 //
 // "faults": {operation: message}: the simulated backend's operation of that
-// name (a Backend method name) fails with the message and changes nothing.
+// name (a Backend method name) fails with the message and changes nothing;
+// "operation word" makes only the calls with that argument fail.
 //
 // Services and firewall: "services" holds the local shell ("tarnShell") and
 // SSH ("ssh"), each "running" now and "enabled" (started with the host);
