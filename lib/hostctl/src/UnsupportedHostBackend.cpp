@@ -85,14 +85,23 @@ public:
     }
     std::vector<std::string> GetVnicNames() override { Unavailable("listing the virtual NICs"); }
     void AddVirtualSwitch(const std::string&) override { Unavailable("creating a virtual switch"); }
+    void RemoveVirtualSwitch(const std::string&) override { Unavailable("removing a virtual switch"); }
     void AddPortGroup(const std::string&, const std::string&, uint16_t) override {
         Unavailable("creating a port group");
     }
-    uint16_t GetDvsPortVlanId(const std::string&, const std::string&) override {
-        Unavailable("reading a distributed port's VLAN");
+    Network::DistributedSwitch::PortSettings GetDvsPortSettings(const std::string&,
+                                                                const std::string&) override {
+        Unavailable("reading a distributed port's properties");
     }
-    std::string AddDvsHostLocalPort(const std::string&, const std::string&) override {
+    std::string AddDvsHostLocalPort(const std::string&,
+                                    const Network::DistributedSwitch::PortSettings&) override {
         Unavailable("creating a host-local distributed port");
+    }
+    void RemoveDvsHostLocalPort(const std::string&, const std::string&) override {
+        Unavailable("removing a host-local distributed port");
+    }
+    void AddDvsUplink(const std::string&, const std::string&, const std::string&) override {
+        Unavailable("adding an uplink to a distributed switch");
     }
     void DisableNetDumper() override { Unavailable("disabling the network core dump sender"); }
     void ClearNetworkConfig() override { Unavailable("clearing the network configuration"); }
