@@ -63,6 +63,7 @@ void SwitchRestoreDialog::AddUndo(const std::string& text, std::function<void()>
 }
 
 bool SwitchRestoreDialog::Undo() {
+    if (_undo.empty()) return true;
     bool complete = true;
     const std::vector<std::pair<std::string, std::function<void()>>> actions = std::move(_undo);
     _undo.clear();

@@ -31,7 +31,8 @@ protected:
     // Undo runs them newest first; `last` ones run after all the others.
     void AddUndo(const std::string& text, std::function<void()> undo, bool last = false);
     // Runs the undo actions as one step of its own and forgets them; false
-    // when one of them failed too (each failure is logged).
+    // when one of them failed too (each failure is logged). Nothing to undo
+    // shows nothing.
     bool Undo();
     // Logs `logLine` and reports `event`, then waits for Enter.
     void Finish(const std::string& logLine, const char* event);

@@ -147,6 +147,7 @@ TEST_F(DvsRestoreTest, StandardSwitchRestoreStopsAtAFailedStepThenMovesTheManage
     ASSERT_TRUE(t->WaitForText("<Enter> OK"));
     EXPECT_TRUE(t->Shows("Creating standard switch kSwitch2. Failed.")) << t->Dump();
     EXPECT_TRUE(t->Lacks("Moving"));
+    EXPECT_TRUE(t->Lacks("Undoing"));  // nothing was done
     EXPECT_TRUE(WaitForLog(host, "no room for another switch"));
     t->SendKey("Enter");
     ASSERT_TRUE(t->WaitForTextGone("<Enter> OK"));
