@@ -5,8 +5,8 @@
 #include "AdapterInfoDialog.hpp"
 #include "DisplayWidth.hpp"
 #include "MessageDialog.hpp"
+#include "QuestionDialog.hpp"
 #include "StringFactory.hpp"
-#include "UsedAdaptersDialog.hpp"
 
 namespace Velk {
 
@@ -130,16 +130,13 @@ std::vector<std::string> AdaptersDialog::MarkedList() const {
 bool AdaptersDialog::Confirm() {
     const std::vector<std::string> list = MarkedList();
     if (list.empty()) {
-        MessageDialog(this, 79,
-                      std::string(_factory->GetString(115)) +
-                          " is selected. Select at least one adapter for the management network.")
-            .Execute();
+        MessageDialog(this, 79, 283).Execute();
         return false;
     }
     const bool takesUsed = std::any_of(_adapters.begin(), _adapters.end(), [&](const Adapter& adapter) {
         return Contains(list, adapter.name) && adapter.IsUsedElsewhere(_switchName);
     });
-    if (takesUsed && !UsedAdaptersDialog(this).Execute()) return false;
+    if (takesUsed && !QuestionDialog(this, 79, 80, 81).Execute()) return false;
     _adapterList = list;
     return true;
 }

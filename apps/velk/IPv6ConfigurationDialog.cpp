@@ -210,7 +210,9 @@ std::vector<Ipv6Network> IPv6ConfigurationDialog::MergeAddresses(const std::vect
                     keep = dhcp;
                     break;
                 case Ipv6AddressType::Static:
-                    keep = false;
+                    // The dynamic choice adds to the static addresses; the
+                    // static choice replaces them by the typed ones.
+                    keep = dhcp || routerAdvertised;
                     break;
             }
         }

@@ -69,7 +69,9 @@ public:
                                                 const std::string& gateway);
     // The address list once the dialog ends with OK: link-local addresses
     // are kept, autoconfigured ones while router advertisement is on, DHCPv6
-    // ones while DHCPv6 is on; the former static entries give way to `typed`.
+    // ones while DHCPv6 is on; the static entries stay with a dynamic choice
+    // (which is only the two switches) and give way to `typed` with the
+    // static one.
     static std::vector<HostCtl::Network::Ipv6Network> MergeAddresses(
         const std::vector<HostCtl::Network::Ipv6Network>& present, bool dhcp, bool routerAdvertised,
         const std::vector<HostCtl::Network::Ipv6Network>& typed);

@@ -1,5 +1,8 @@
 #include "NetworkRestoreWindow.hpp"
 
+#include <algorithm>
+#include <cstdint>
+
 #include "ManagementInterface.hpp"
 #include "RestoreDvsDialog.hpp"
 #include "RestoreNetworkDialog.hpp"
@@ -40,15 +43,24 @@ void NetworkRestoreWindow::AddEntry(int textId, bool shown) {
 }
 
 void NetworkRestoreWindow::RemoveEntry(int textId) {
+    const int selected = _menu->GetCurrentIndex();
+    size_t removed = SIZE_MAX;
     for (size_t i = 0; i < _ids.size(); ++i) {
         if (_ids[i] != textId) continue;
         delete _items[i];
         _items.erase(_items.begin() + static_cast<std::ptrdiff_t>(i));
         _ids.erase(_ids.begin() + static_cast<std::ptrdiff_t>(i));
+        removed = i;
         break;
     }
-    // The first entry is always there, so the list keeps a selection.
+    // The first entry is always there, so the list keeps a selection. A
+    // selected entry that goes hands the selection on to the one after it
+    // (the one before it when it was the last).
     _menu->SetItems(std::vector<Item*>(_items.begin(), _items.end()));
+    if (selected < 0) return;
+    int keep = selected;
+    if (static_cast<size_t>(selected) > removed) --keep;
+    _menu->SetCurrent(std::min(keep, static_cast<int>(_items.size()) - 1));
 }
 
 int NetworkRestoreWindow::SelectedId() const {

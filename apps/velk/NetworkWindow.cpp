@@ -96,22 +96,23 @@ bool NetworkWindow::ReadConfiguration() {
     return true;
 }
 
-// The team and VLAN of the management port group. What cannot be read is not
-// offered for editing, so that the apply never writes values nobody saw.
+// The team and VLAN of the management port group. A port that is not on a
+// standard switch is not offered for editing; a team or VLAN that cannot be
+// read ends the window like every other read at entry.
 void NetworkWindow::ReadSwitch() {
     if (!FindManagementPort(*_mgmtIntf, _port)) return;
     try {
         _adapters = _adaptersAtStart = ReadTeam(_port.switchName);
     } catch (const HostCtlException& e) {
         Syslog(LOG_ERR, "Getting uplinks failed: %s", e.what());
-        return;
+        throw;
     }
     try {
         _vlanId = _vlanIdAtStart =
             HostCtl::Network::VirtualSwitch(_port.switchName).GetPortGroupVlanId(_port.portGroup);
     } catch (const HostCtlException& e) {
         Syslog(LOG_ERR, "Getting VlanID failed: %s", e.what());
-        return;
+        throw;
     }
     _nics = ReadAdapters();
     _switchEditable = true;

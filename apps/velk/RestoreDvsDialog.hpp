@@ -1,7 +1,8 @@
 // "Restore kDS": gives the management interface a new port on its
-// distributed switch: a port that lives on this host only, cloned from the
-// management port (VLAN and the other properties), and moves the interface
-// onto it.
+// distributed switch, a port that lives on this host only, with the
+// properties entered in its dialog (VLAN, blocking, uplinks; the rest as
+// defaults), and moves the interface onto it. A failed step puts the
+// interface back on its old port and takes the new port away again.
 #pragma once
 
 #include <memory>
@@ -20,7 +21,9 @@ public:
     int Run() override;
 
 private:
-    void ReadManagementPort();
+    void CreatePort(const HostCtl::Network::DistributedSwitch::PortSettings& settings);
+    void MoveInterface();
+    void ShowAddress();
 
     std::string _portKey;
     std::string _newPortKey;

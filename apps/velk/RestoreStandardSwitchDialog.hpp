@@ -1,8 +1,11 @@
 // "Restore Standard Switch": moves the management network off its
 // distributed switch onto a new standard switch: a management port group with
-// the distributed port's VLAN, the distributed switch's uplinks, and the
-// management interface with its IP settings. The host's other interfaces are
-// disabled, as they may depend on the distributed switch.
+// the distributed port's VLAN, the distributed switch's uplinks on this host,
+// and the management interface with its IP settings. The host's other
+// interfaces are disabled, as they may depend on the distributed switch.
+// Each NIC leaves the distributed switch only for the new switch: when the
+// new switch does not take it, it goes back; a failed step undoes the ones
+// before it. Without an uplink on this host there is nothing to move.
 #pragma once
 
 #include <memory>
@@ -28,12 +31,17 @@ public:
 private:
     void ReadManagementNetwork();
     void CreateSwitch();
-    void MoveUplinks();
+    void AddPortGroup();
+    bool MoveUplinks();
+    void MoveUplink(const HostCtl::Network::DistributedSwitch::UplinkPort& port, bool standby);
     void MoveInterface();
     void DisableOtherInterfaces();
 
     uint16_t _vlanId = 0;
-    std::vector<std::string> _uplinks;
+    std::string _portKey;
+    std::vector<HostCtl::Network::DistributedSwitch::UplinkPort> _uplinks;
+    bool _noUplinks = false;
+    unsigned _maxActive = 0;
     std::string _switchName;
     std::string _portGroup;
 };

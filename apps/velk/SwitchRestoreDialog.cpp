@@ -26,6 +26,8 @@ bool SwitchRestoreDialog::Confirm(const std::string& title, const std::string& h
         "{color:dark-grey}Cancel{/color}{/align}");
     Refresh();
     if (!WaitForF11()) return false;
+    // The steps take the whole area.
+    _log->SetText("");
     SetFooter("");
     return true;
 }
@@ -48,6 +50,39 @@ bool SwitchRestoreDialog::Step(const std::string& text, const std::function<void
     return true;
 }
 
+void SwitchRestoreDialog::ShowLine(const std::string& text) {
+    _log->AppendText(TextArea::Escape(text) + "\n");
+    Refresh();
+}
+
+void SwitchRestoreDialog::AddUndo(const std::string& text, std::function<void()> undo, bool last) {
+    if (last)
+        _undo.insert(_undo.begin(), {text, std::move(undo)});
+    else
+        _undo.emplace_back(text, std::move(undo));
+}
+
+bool SwitchRestoreDialog::Undo() {
+    if (_undo.empty()) return true;
+    bool complete = true;
+    const std::vector<std::pair<std::string, std::function<void()>>> actions = std::move(_undo);
+    _undo.clear();
+    Step(_factory->GetString(280), [&] {
+        // Every action is tried, whatever the ones before it did.
+        for (auto action = actions.rbegin(); action != actions.rend(); ++action) {
+            Syslog(LOG_INFO, "%s", action->first.c_str());
+            try {
+                action->second();
+            } catch (const HostCtl::Lib::HostCtlException& e) {
+                Syslog(LOG_ERR, "%s failed: %s", action->first.c_str(), e.what());
+                complete = false;
+            }
+        }
+        if (!complete) throw HostCtl::Lib::HostCtlException("the host is not as it was before the restore");
+    });
+    return complete;
+}
+
 void SwitchRestoreDialog::Finish(const std::string& logLine, const char* event) {
     Syslog(LOG_INFO, "%s", logLine.c_str());
     ReportObzEvent("%s", event);
@@ -66,6 +101,13 @@ HostCtl::Network::ConnectionPoint SwitchRestoreDialog::ReadDvsPort() {
         throw HostCtl::Lib::HostCtlException("the management interface is not on a distributed switch");
     _dvsName = point.GetSwitchName();
     return point;
+}
+
+std::vector<HostCtl::Network::DistributedSwitch::UplinkPort> SwitchRestoreDialog::ReadHostUplinks() const {
+    std::vector<HostCtl::Network::DistributedSwitch::UplinkPort> backed;
+    for (const auto& port : HostCtl::Network::DistributedSwitch(_dvsName).GetUplinkPorts())
+        if (!port.pnic.empty()) backed.push_back(port);
+    return backed;
 }
 
 }  // namespace Velk

@@ -680,6 +680,26 @@ const char* en_US_Factory::GetString(int id) {
                    "minutes.";
         case 273:
             return "VELK idle timeout";
+        case 274:
+            return "Reading the management network.";
+        case 275:
+            return "Creating standard switch ";
+        case 276:
+            return "Adding port group ";
+        case 277:
+            return "Moving uplink ";
+        case 278:
+            return "Moving management interface ";
+        case 279:
+            return "Disabling other interfaces.";
+        case 280:
+            return "Undoing the steps already done.";
+        case 281:
+            return "Creating host local port on ";
+        case 282:
+            return "VLAN ID (1-4094, empty for none):";
+        case 283:
+            return "No adapter is selected. Select at least one adapter for the management network.";
         default:
             return "";
     }

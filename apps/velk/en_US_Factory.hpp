@@ -20,7 +20,7 @@ public:
     // Reads the record through `reader` (tests count and fail the reads).
     explicit en_US_Factory(RecordReader reader);
 
-    // Texts 0 to 273; text 2, the product heading, is built from the
+    // Texts 0 to 283; text 2, the product heading, is built from the
     // system-version record on first use and kept, empty when the record
     // can't be read (no retry). Text 3 is empty on purpose (blank menu rows).
     const char* GetString(int id) override;
@@ -29,7 +29,7 @@ public:
     // system-version record.
     static std::string FormatHeading(const char* record);
 
-    static constexpr int LAST_ID = 273;
+    static constexpr int LAST_ID = 283;
 
 private:
     const char* Heading();

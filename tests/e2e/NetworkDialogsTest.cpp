@@ -177,6 +177,27 @@ TEST_F(NetworkTest, Ipv4AndIpv6FieldsAreChecked) {
     EXPECT_TRUE(t->Shows("Automatic"));
 }
 
+// The dynamic choice is only the two switches: a static address stays and
+// is written beside what router advertisements bring.
+TEST_F(NetworkTest, RouterAdvertisementKeepsTheStaticIpv6Address) {
+    host.Set("/network/vnics/0/ipv6/routerAdvertisement", false);
+    host.Set("/network/vnics/0/ipv6/static", json::array({{{"address", "2001:db8::10"}, {"prefix", 64}}}));
+    host.Boot();
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(OpenDialog(kIpv6));
+    EXPECT_TRUE(t->Shows("(o) Set static IPv6 address")) << t->Dump();
+    Keys({"Down", " "});
+    ASSERT_TRUE(Confirm(kIpv6));
+    ASSERT_TRUE(SelectEntry(*t, "IPv6 Configuration"));
+    EXPECT_TRUE(t->Shows("Automatic"));
+    EXPECT_TRUE(t->Shows("2001:db8::10/64")) << t->Dump();
+    ASSERT_TRUE(LeaveAndApply());
+    const json ipv6 = host.Get("/network/vnics/0/ipv6");
+    EXPECT_EQ(ipv6["routerAdvertisement"], true);
+    EXPECT_EQ(ipv6["static"], json::array({{{"address", "2001:db8::10"}, {"prefix", 64}}})) << ipv6.dump(1);
+    EXPECT_NE(ipv6["addresses"].dump().find("2001:db8::10"), std::string::npos) << ipv6.dump(1);
+}
+
 TEST_F(NetworkTest, DnsServersAndSuffixesAreTakenAsTyped) {
     ASSERT_TRUE(OpenNetwork());
     ASSERT_TRUE(OpenDialog(kDns));

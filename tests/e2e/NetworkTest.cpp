@@ -109,6 +109,44 @@ TEST_F(StaticNetworkTest, DhcpOnAVlanWithAServerShowsTheLease) {
     EXPECT_TRUE(t->Lacks("DHCP lookup failed"));
 }
 
+// The bottom line shows each step cut to the screen's width by columns: a
+// wide character that no longer fits is left out whole.
+TEST_F(NetworkTest, StepLineIsCutByColumns) {
+    std::string wide;
+    for (int i = 0; i < 30; ++i) wide += "\u540d";
+    host.Set("/network/dns/hostname", "x" + wide);
+    ASSERT_TRUE(OpenNetwork());
+    ASSERT_TRUE(Edit(kSuffixes, {"lab.test"}));
+    t->SendKey("Esc");
+    ASSERT_TRUE(t->WaitForText(kRestartQuestion));
+    t->Send("y");
+    // The host refuses such a name: its error box holds the apply at that step.
+    ASSERT_TRUE(t->WaitForText(kErrorTitle));
+    EXPECT_EQ(t->RowTextTrimmed(24), " Setting hostname to x" + wide.substr(0, 28 * 3)) << t->Dump();
+    t->SendKey("Enter");
+    ASSERT_TRUE(WaitForLog(host, "Network settings changed."));
+}
+
+// A read of the management switch that fails as the window opens ends the
+// window with the main menu's error box.
+class EntryReadTest : public NetworkTest, public ::testing::WithParamInterface<const char*> {};
+
+TEST_P(EntryReadTest, EndsTheWindowWithTheMenusErrorBox) {
+    host.Fail(GetParam(), "the switch is locked");
+    ASSERT_TRUE(StartInMenu());
+    ASSERT_TRUE(SelectEntry(*t, "Configure Management Network"));
+    t->SendKey("Enter");
+    ASSERT_TRUE(t->WaitForText("Operation on the management network interface failed."));
+    EXPECT_TRUE(t->Lacks(kNetworkFooter)) << t->Dump();
+    t->SendKey("Enter");
+    ASSERT_TRUE(t->WaitForTextGone("Operation on the management network interface failed."));
+    EXPECT_TRUE(WaitForMenu(*t));
+    EXPECT_TRUE(WaitForLog(host, "the switch is locked"));
+}
+
+INSTANTIATE_TEST_SUITE_P(Reads, EntryReadTest, ::testing::Values("GetTeamingPolicy", "GetPortGroupVlanId"),
+                         [](const auto& info) { return std::string(info.param); });
+
 // One host operation made to fail: its line is logged and shown, and the
 // steps after it still reach the host.
 struct FaultCase {

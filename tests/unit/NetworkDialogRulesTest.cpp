@@ -180,12 +180,20 @@ TEST(NetworkDialogRules, Ipv6AddressListKeepsWhatTheModeStillObtains) {
          {"2001:db8::6/64", "2001:db8:1::1/48"},
          "fe80::1/64 autoconf; fe80::5/64 static; 2001:db8::6/64 static; 2001:db8:1::1/48 static; "},
         {false, false, {}, "fe80::1/64 autoconf; fe80::5/64 static; "},
-        {false, true, {}, "fe80::1/64 autoconf; 2001:db8::a/64 autoconf; fe80::5/64 static; "},
-        {true, false, {}, "fe80::1/64 autoconf; 2001:db8::d/128 dhcp; fe80::5/64 static; "},
+        {false,
+         true,
+         {},
+         "fe80::1/64 autoconf; 2001:db8::a/64 autoconf; 2001:db8::5/64 static; fe80::5/64 static; "},
+        {true,
+         false,
+         {},
+         "fe80::1/64 autoconf; 2001:db8::d/128 dhcp; 2001:db8::5/64 static; fe80::5/64 static; "},
         {true,
          true,
          {},
-         "fe80::1/64 autoconf; 2001:db8::a/64 autoconf; 2001:db8::d/128 dhcp; fe80::5/64 static; "},
+         "fe80::1/64 autoconf; 2001:db8::a/64 autoconf; 2001:db8::d/128 dhcp; 2001:db8::5/64 static; "
+         "fe80::5/64 "
+         "static; "},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(testing::Message() << "dhcp " << c.dhcp << ", advertised " << c.routerAdvertised);

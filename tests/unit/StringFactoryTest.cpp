@@ -33,7 +33,8 @@ TEST(StringFactory, Texts) {
          "software. This will affect all running services.\nCollection of extra troubleshooting "
          "information can take a noticeable amount of time.{/color}"},
         {251, "Please, wait ..."},
-        {274, ""},
+        {280, "Undoing the steps already done."},
+        {284, ""},
         {1000, ""},
         {-1, ""},
     };
@@ -51,7 +52,7 @@ TEST(StringFactory, EveryIdButTheBlankHasText) {
             ADD_FAILURE() << "empty text " << id;
         }
     }
-    EXPECT_EQ(nonEmpty, 272);
+    EXPECT_EQ(nonEmpty, 282);
 }
 
 TEST(StringFactory, TheOneFactoryServesEveryLocale) {

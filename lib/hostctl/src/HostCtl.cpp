@@ -130,12 +130,26 @@ void DistributedSwitch::RemoveUplink(const std::string& pnic) {
     Lib::GetBackend().RemoveDvsUplink(_name, pnic);
 }
 
-uint16_t DistributedSwitch::GetPortVlanId(const std::string& portKey) const {
-    return Lib::GetBackend().GetDvsPortVlanId(_name, portKey);
+void DistributedSwitch::AddUplink(const std::string& uplinkPortKey, const std::string& pnic) {
+    Lib::GetBackend().AddDvsUplink(_name, uplinkPortKey, pnic);
 }
 
-std::string DistributedSwitch::AddHostLocalPort(const std::string& fromPortKey) {
-    return Lib::GetBackend().AddDvsHostLocalPort(_name, fromPortKey);
+DistributedSwitch::PortSettings DistributedSwitch::GetPortSettings(const std::string& portKey) const {
+    return Lib::GetBackend().GetDvsPortSettings(_name, portKey);
+}
+
+uint16_t DistributedSwitch::GetPortVlanId(const std::string& portKey) const {
+    return GetPortSettings(portKey).vlanId;
+}
+
+std::string DistributedSwitch::AddHostLocalPort(const PortSettings& settings) {
+    if (settings.vlanId > 4095)
+        throw Lib::HostCtlException("VLAN ID " + std::to_string(settings.vlanId) + " is above 4095");
+    return Lib::GetBackend().AddDvsHostLocalPort(_name, settings);
+}
+
+void DistributedSwitch::RemoveHostLocalPort(const std::string& portKey) {
+    Lib::GetBackend().RemoveDvsHostLocalPort(_name, portKey);
 }
 
 }  // namespace Network

@@ -250,6 +250,10 @@ void VirtualSwitchInfoImpl::AddVirtualSwitch(const std::string& name) {
     GetBackend().AddVirtualSwitch(name);
 }
 
+void VirtualSwitchInfoImpl::RemoveVirtualSwitch(const std::string& name) {
+    GetBackend().RemoveVirtualSwitch(name);
+}
+
 std::vector<HostCtl::Network::IpAddress> NameResolverImpl::Resolve(const std::string& name) {
     return GetBackend().ResolveHostName(name);
 }

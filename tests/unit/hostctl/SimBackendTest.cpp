@@ -268,6 +268,7 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
     const Ipv6Address gateway6("2001:db8::1");
     const std::vector<std::string> domains{"lab.test"}, none;
     const HostCtl::Lib::AdvancedOptionValue timeout{true, 30, ""};
+    const HostCtl::Network::DistributedSwitch::PortSettings portSettings{0, false, {"uplink1"}};
     std::vector<std::pair<std::string, std::function<void(Backend&)>>> calls = {
         OP(GetVersionRecord),
         OP(GetHardwareVendor),
@@ -292,6 +293,7 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
         OP(GetConnectionPointSwitch, mgmtGroup),
         OP(GetVirtualSwitchNames),
         OP(AddVirtualSwitch, "kSwitch2"),
+        OP(RemoveVirtualSwitch, "kSwitch1"),
         OP(GetVirtualSwitchUplinks, "kSwitch0"),
         OP(GetTeamingPolicy, "kSwitch0"),
         OP(GetMaxActiveUplinks, "kSwitch0"),
@@ -304,8 +306,10 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
         OP(GetDistributedSwitchNames),
         OP(GetDvsUplinkPorts, "kDS-1"),
         OP(RemoveDvsUplink, "kDS-1", "zonic1"),
-        OP(GetDvsPortVlanId, "kDS-1", "100"),
-        OP(AddDvsHostLocalPort, "kDS-1", "100"),
+        OP(AddDvsUplink, "kDS-1", "uplink2", "zonic3"),
+        OP(GetDvsPortSettings, "kDS-1", "100"),
+        OP(AddDvsHostLocalPort, "kDS-1", portSettings),
+        OP(RemoveDvsHostLocalPort, "kDS-1", "101"),
         OP(DisableNetDumper),
         OP(ClearNetworkConfig),
         OP(AutoConfigNetwork),
@@ -394,7 +398,7 @@ TEST(LinuxBackendTest, RefusesWhatADebianHostLacks) {
         {"listing a distributed switch's uplinks: a Debian host has no distributed switches",
          CALL(GetDvsUplinkPorts, "dvs0")},
         {"creating a host-local distributed port: a Debian host has no distributed switches",
-         CALL(AddDvsHostLocalPort, "dvs0", "10")},
+         CALL(AddDvsHostLocalPort, "dvs0", HostCtl::Network::DistributedSwitch::PortSettings{})},
         {"handing devices to the driver VM: a Debian host has no driver VM", CALL(SetDriverVmOwned, {"x"})},
         {"setting firewall ruleset \"sshServer\": a Debian host's firewall is not managed by Velk",
          CALL(SetFirewallRulesetEnabled, "sshServer", true)},

@@ -55,10 +55,27 @@ TEST_F(RestoreTest, SwitchAndPortOperations) {
          [](const json& n) {
              EXPECT_EQ(n["vswitches"][1]["portgroups"][1], json({{"name", "Lab"}, {"vlan", 20}}));
          }},
-        {"AddDvsHostLocalPort", [&] { EXPECT_EQ(backend.AddDvsHostLocalPort("kDS-1", "100"), "102"); },
+        {"AddDvsHostLocalPort",
+         [] {
+             EXPECT_EQ(DistributedSwitch("kDS-1").AddHostLocalPort({30, true, {"uplink1"}}), "102");
+         },
          [](const json& n) {
-             EXPECT_EQ(n["dvswitches"][0]["ports"][2],
-                       json({{"key", "102"}, {"vlan", 20}, {"hostLocal", true}, {"connectee", ""}}));
+             EXPECT_EQ(n["dvswitches"][0]["ports"][2], json({{"key", "102"},
+                                                             {"vlan", 30},
+                                                             {"blocked", true},
+                                                             {"uplinks", {"uplink1"}},
+                                                             {"hostLocal", true},
+                                                             {"connectee", ""}}));
+         }},
+        {"RemoveDvsHostLocalPort", [] { DistributedSwitch("kDS-1").RemoveHostLocalPort("101"); },
+         [](const json& n) { EXPECT_EQ(n["dvswitches"][0]["ports"].size(), 1u); }},
+        {"AddDvsUplink", [] { DistributedSwitch("kDS-1").AddUplink("uplink2", "zonic3"); },
+         [](const json& n) { EXPECT_EQ(n["dvswitches"][0]["uplinkPorts"][1]["pnic"], "zonic3"); }},
+        {"RemoveVirtualSwitch",
+         [] { QelCtl::Network::VirtualSwitchInfoImpl().RemoveVirtualSwitch("kSwitch1"); },
+         [](const json& n) {
+             ASSERT_EQ(n["vswitches"].size(), 1u);
+             EXPECT_EQ(n["vswitches"][0]["name"], "kSwitch0");
          }},
     };
     for (const Case& c : cases) {
@@ -81,27 +98,59 @@ TEST_F(RestoreTest, SwitchAndPortOperations) {
         {"a port group that exists", [] { VirtualSwitch("kSwitch1").AddPortGroup("Management Network", 0); }},
         {"a port group on VLAN 4096", [&] { backend.AddPortGroup("kSwitch1", "Lab", 4096); }},
         {"a port group without name", [&] { backend.AddPortGroup("kSwitch1", "", 0); }},
-        {"a host-local port like an unknown one", [&] { backend.AddDvsHostLocalPort("kDS-1", "999"); }},
+        {"a host-local port on an unknown uplink",
+         [] {
+             DistributedSwitch("kDS-1").AddHostLocalPort({0, false, {"uplink9"}});
+         }},
+        {"removing a port that is not host-local",
+         [] { DistributedSwitch("kDS-1").RemoveHostLocalPort("100"); }},
+        {"an uplink port that a NIC backs",
+         [] { DistributedSwitch("kDS-1").AddUplink("uplink1", "zonic3"); }},
+        {"an uplink of another switch", [] { DistributedSwitch("kDS-1").AddUplink("uplink2", "zonic0"); }},
+        {"removing a switch in use",
+         [] { QelCtl::Network::VirtualSwitchInfoImpl().RemoveVirtualSwitch("kSwitch0"); }},
     };
     for (const auto& [name, call] : refused) {
         SCOPED_TRACE(name);
         Reset(HostWithDvs());
         ExpectRefused(call);
     }
+    Reset(HostWithDvs());
+    qk0.SetConnectionPoint(ConnectionPoint(2, "101"));
+    ExpectRefused([] { DistributedSwitch("kDS-1").RemoveHostLocalPort("101"); });
 
     // The reads, and a new connection seen at the next renew.
     Reset(HostWithDvs());
     EXPECT_EQ(QelCtl::Network::NetworkInfoImpl().GetVirtualNicNames(),
               (std::vector<std::string>{"qk0", "qk1"}));
-    EXPECT_EQ(backend.GetDvsPortVlanId("kDS-1", "100"), 20);
-    EXPECT_EQ(backend.GetDvsPortVlanId("kDS-1", "101"), 0);
-    EXPECT_THROW(backend.GetDvsPortVlanId("kDS-1", "999"), HostCtlException);
+    EXPECT_EQ(backend.GetDvsPortSettings("kDS-1", "100").vlanId, 20);
+    EXPECT_EQ(backend.GetDvsPortSettings("kDS-1", "101").vlanId, 0);
+    EXPECT_THROW(backend.GetDvsPortSettings("kDS-1", "999"), HostCtlException);
     QelNic("qk1").SetConnectionPoint(ConnectionPoint(1, "VM Network"));
     qk0.SetConnectionPoint(ConnectionPoint(2, "100"));
     EXPECT_EQ(qk0.GetConnectionPoint().GetName(), "100");
     EXPECT_EQ(Address(), "192.0.2.100");
     qk0.RenewDhcpLease();  // VLAN 20, where qk1 holds .100
     EXPECT_EQ(Address(), "198.51.100.101");
+
+    // A blocked port, or one whose only uplink has no link, reaches nothing.
+    DistributedSwitch dvs("kDS-1");
+    const std::string blocked = dvs.AddHostLocalPort({0, true, {}});
+    const auto settings = dvs.GetPortSettings(blocked);
+    EXPECT_TRUE(settings.blocked);
+    EXPECT_TRUE(settings.uplinks.empty());
+    qk0.SetConnectionPoint(ConnectionPoint(2, blocked));
+    qk0.Restart();
+    EXPECT_EQ(Address(), "0.0.0.0");
+    Edit([](json& s) { s["network"]["pnics"][1]["linkUp"] = false; });
+    const std::string limited = dvs.AddHostLocalPort({0, false, {"uplink1"}});
+    EXPECT_EQ(dvs.GetPortSettings(limited).uplinks, std::vector<std::string>{"uplink1"});
+    qk0.SetConnectionPoint(ConnectionPoint(2, limited));
+    qk0.Restart();
+    EXPECT_EQ(Address(), "0.0.0.0");
+    Edit([](json& s) { s["network"]["pnics"][1]["linkUp"] = true; });
+    qk0.Restart();
+    EXPECT_EQ(Address(), "192.0.2.100");
 }
 
 TEST_F(RestoreTest, FactoryRestore) {

@@ -25,6 +25,7 @@ namespace HostCtlTest {
 using HostCtl::Lib::GetBackend;
 using HostCtl::Lib::HostCtlException;
 using HostCtl::Network::ConnectionPoint;
+using HostCtl::Network::DistributedSwitch;
 using HostCtl::Network::IpAddress;
 using HostCtl::Network::IpConfig;
 using HostCtl::Network::Ipv4Address;
@@ -88,12 +89,12 @@ inline void Vlan20(json& s) { SetMgmtVlan(s, 20); }
 inline json HostWithDvs() {
     json s = HostCtl::Lib::DefaultHostState();
     json& network = s["network"];
-    network["dvswitches"] =
-        json::array({{{"name", "kDS-1"},
-                      {"uplinkPorts", {{{"key", "uplink1"}, {"pnic", "zonic1"}}}},
-                      {"ports",
-                       {{{"key", "100"}, {"vlan", 20}, {"hostLocal", false}, {"connectee", "qk1"}},
-                        {{"key", "101"}, {"vlan", 0}, {"hostLocal", false}, {"connectee", ""}}}}}});
+    network["dvswitches"] = json::array(
+        {{{"name", "kDS-1"},
+          {"uplinkPorts", {{{"key", "uplink1"}, {"pnic", "zonic1"}}, {{"key", "uplink2"}, {"pnic", ""}}}},
+          {"ports",
+           {{{"key", "100"}, {"vlan", 20}, {"hostLocal", false}, {"connectee", "qk1"}},
+            {{"key", "101"}, {"vlan", 0}, {"hostLocal", true}, {"connectee", ""}}}}}});
     json qk1 = network["vnics"][0];
     qk1.erase("portgroup");
     qk1["name"] = "qk1";

@@ -90,6 +90,7 @@ public:
     virtual std::string GetConnectionPointSwitch(const Network::ConnectionPoint& point) = 0;
     virtual std::vector<std::string> GetVirtualSwitchNames() = 0;
     virtual void AddVirtualSwitch(const std::string& vswitch) = 0;
+    virtual void RemoveVirtualSwitch(const std::string& vswitch) = 0;
     virtual std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) = 0;
     virtual Network::TeamingPolicy GetTeamingPolicy(const std::string& vswitch) = 0;
     virtual unsigned GetMaxActiveUplinks(const std::string& vswitch) = 0;
@@ -104,9 +105,14 @@ public:
     virtual std::vector<std::string> GetDistributedSwitchNames() = 0;
     virtual std::vector<Network::DistributedSwitch::UplinkPort> GetDvsUplinkPorts(const std::string& dvs) = 0;
     virtual void RemoveDvsUplink(const std::string& dvs, const std::string& pnic) = 0;
-    virtual uint16_t GetDvsPortVlanId(const std::string& dvs, const std::string& port) = 0;
+    virtual void AddDvsUplink(const std::string& dvs, const std::string& uplinkPort,
+                              const std::string& pnic) = 0;
+    virtual Network::DistributedSwitch::PortSettings GetDvsPortSettings(const std::string& dvs,
+                                                                        const std::string& port) = 0;
     // Returns the new port's key.
-    virtual std::string AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort) = 0;
+    virtual std::string AddDvsHostLocalPort(const std::string& dvs,
+                                            const Network::DistributedSwitch::PortSettings& settings) = 0;
+    virtual void RemoveDvsHostLocalPort(const std::string& dvs, const std::string& port) = 0;
 
     // The factory restore of the network (see QelCtl::Network::NetworkInfoImpl).
     virtual void DisableNetDumper() = 0;

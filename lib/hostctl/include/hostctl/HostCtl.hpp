@@ -255,6 +255,14 @@ public:
         std::string pnic;
     };
 
+    // The properties of a port that the host sets.
+    struct PortSettings {
+        uint16_t vlanId = 0;   // 0: none, 4095: all
+        bool blocked = false;  // a blocked port passes no traffic
+        // Keys of the uplink ports its traffic may use; empty: all of them.
+        std::vector<std::string> uplinks;
+    };
+
     explicit DistributedSwitch(std::string name) : _name(std::move(name)) {}
     const std::string& GetName() const { return _name; }
     std::vector<UplinkPort> GetUplinkPorts() const;
@@ -262,11 +270,17 @@ public:
     std::vector<std::string> GetUsedUplinks() const;
     // Frees the uplink port the NIC backs.
     void RemoveUplink(const std::string& pnic);
+    // Lets the NIC back the free uplink port `uplinkPortKey`; a NIC attached
+    // to any switch is refused.
+    void AddUplink(const std::string& uplinkPortKey, const std::string& pnic);
+    PortSettings GetPortSettings(const std::string& portKey) const;
     // The VLAN of one of the switch's ports (0: none, 4095: all).
     uint16_t GetPortVlanId(const std::string& portKey) const;
-    // Creates a port that lives on this host only, with the VLAN and the
-    // other properties of `fromPortKey`; returns its key.
-    std::string AddHostLocalPort(const std::string& fromPortKey);
+    // Creates a port that lives on this host only, with `settings` and
+    // defaults for every other property; returns its key.
+    std::string AddHostLocalPort(const PortSettings& settings);
+    // Removes a host-local port that nothing is connected to.
+    void RemoveHostLocalPort(const std::string& portKey);
 
 private:
     std::string _name;

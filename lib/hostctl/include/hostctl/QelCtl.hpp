@@ -203,6 +203,9 @@ public:
     std::vector<std::string> GetVirtualSwitchNames();
     // Creates a standard switch without uplinks or port groups.
     void AddVirtualSwitch(const std::string& name);
+    // Removes a standard switch with its port groups, which no virtual NIC
+    // may use; its uplinks are set free.
+    void RemoveVirtualSwitch(const std::string& name);
 };
 
 // The host's hosts file ("/etc/hosts").

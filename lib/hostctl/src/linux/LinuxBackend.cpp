@@ -715,6 +715,7 @@ public:
         Refuse("setting the management interface's MAC address", "a bridge takes its MAC from its ports");
     }
     void AddVirtualSwitch(const std::string&) override { Refuse("creating a switch", NO_MOVE); }
+    void RemoveVirtualSwitch(const std::string&) override { Refuse("removing a switch", NO_MOVE); }
     void AddPortGroup(const std::string&, const std::string&, uint16_t) override {
         Refuse("creating a port group", NO_MOVE);
     }
@@ -734,11 +735,17 @@ public:
     void RemoveDvsUplink(const std::string&, const std::string&) override {
         Refuse("removing a distributed switch's uplink", NO_DVS);
     }
-    uint16_t GetDvsPortVlanId(const std::string&, const std::string&) override {
-        Refuse("reading a distributed port's VLAN", NO_DVS);
+    void AddDvsUplink(const std::string&, const std::string&, const std::string&) override {
+        Refuse("adding a distributed switch's uplink", NO_DVS);
     }
-    std::string AddDvsHostLocalPort(const std::string&, const std::string&) override {
+    Network::DistributedSwitch::PortSettings GetDvsPortSettings(const std::string&, const std::string&) override {
+        Refuse("reading a distributed port's settings", NO_DVS);
+    }
+    std::string AddDvsHostLocalPort(const std::string&, const Network::DistributedSwitch::PortSettings&) override {
         Refuse("creating a host-local distributed port", NO_DVS);
+    }
+    void RemoveDvsHostLocalPort(const std::string&, const std::string&) override {
+        Refuse("removing a host-local distributed port", NO_DVS);
     }
 
     // Host name and resolver.

@@ -62,6 +62,7 @@ const std::vector<std::string> OPERATIONS = {
     "GetConnectionPointSwitch",
     "GetVirtualSwitchNames",
     "AddVirtualSwitch",
+    "RemoveVirtualSwitch",
     "GetVirtualSwitchUplinks",
     "GetTeamingPolicy",
     "GetMaxActiveUplinks",
@@ -74,8 +75,10 @@ const std::vector<std::string> OPERATIONS = {
     "GetDistributedSwitchNames",
     "GetDvsUplinkPorts",
     "RemoveDvsUplink",
-    "GetDvsPortVlanId",
+    "AddDvsUplink",
+    "GetDvsPortSettings",
     "AddDvsHostLocalPort",
+    "RemoveDvsHostLocalPort",
     "DisableNetDumper",
     "ClearNetworkConfig",
     "AutoConfigNetwork",
@@ -357,6 +360,11 @@ public:
                 {vswitch});
     }
 
+    void RemoveVirtualSwitch(const std::string& vswitch) override {
+        Writing("RemoveVirtualSwitch", [&](json& s) { NetworkModel(_sim, s).RemoveVirtualSwitch(vswitch); },
+                {vswitch});
+    }
+
     std::vector<std::string> GetVirtualSwitchUplinks(const std::string& vswitch) override {
         return Reading("GetVirtualSwitchUplinks", [&](const json& s) {
             return _sim.StringList(s, NetworkView(_sim, s).VswitchPointer(vswitch) + "/uplinks");
@@ -445,22 +453,41 @@ public:
                 {dvs, pnic});
     }
 
-    uint16_t GetDvsPortVlanId(const std::string& dvs, const std::string& port) override {
-        return Reading("GetDvsPortVlanId", [&](const json& s) {
+    void AddDvsUplink(const std::string& dvs, const std::string& uplinkPort,
+                      const std::string& pnic) override {
+        Writing("AddDvsUplink", [&](json& s) { NetworkModel(_sim, s).AddDvsUplink(dvs, uplinkPort, pnic); },
+                {dvs, uplinkPort, pnic});
+    }
+
+    Network::DistributedSwitch::PortSettings GetDvsPortSettings(const std::string& dvs,
+                                                                const std::string& port) override {
+        return Reading("GetDvsPortSettings", [&](const json& s) {
             NetworkView network(_sim, s);
-            const std::string p = network.DvsPortPointer(network.DvsPointer(dvs), port) + "/vlan";
-            const uint64_t vlan = _sim.Unsigned(s, p);
-            if (vlan > 4095) throw _sim.Error("field " + p + " is above 4095");
-            return uint16_t(vlan);
+            const std::string p = network.DvsPortPointer(network.DvsPointer(dvs), port);
+            Network::DistributedSwitch::PortSettings settings;
+            const uint64_t vlan = _sim.Unsigned(s, p + "/vlan");
+            if (vlan > 4095) throw _sim.Error("field " + p + "/vlan is above 4095");
+            settings.vlanId = uint16_t(vlan);
+            // Ports made before these properties existed leave them out.
+            const json& object = s.at(json::json_pointer(p));
+            if (object.contains("blocked")) settings.blocked = _sim.Bool(s, p + "/blocked");
+            if (object.contains("uplinks")) settings.uplinks = _sim.StringList(s, p + "/uplinks");
+            return settings;
         });
     }
 
-    std::string AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort) override {
+    std::string AddDvsHostLocalPort(const std::string& dvs,
+                                    const Network::DistributedSwitch::PortSettings& settings) override {
         std::string key;
         Writing("AddDvsHostLocalPort",
-                [&](json& s) { key = NetworkModel(_sim, s).AddDvsHostLocalPort(dvs, fromPort); },
-                {dvs, fromPort});
+                [&](json& s) { key = NetworkModel(_sim, s).AddDvsHostLocalPort(dvs, settings); },
+                {dvs, settings.vlanId, settings.blocked, settings.uplinks});
         return key;
+    }
+
+    void RemoveDvsHostLocalPort(const std::string& dvs, const std::string& port) override {
+        Writing("RemoveDvsHostLocalPort",
+                [&](json& s) { NetworkModel(_sim, s).RemoveDvsHostLocalPort(dvs, port); }, {dvs, port});
     }
 
     // The factory restore of the network: the core dump sender lets go of

@@ -269,10 +269,20 @@ bool NetworkView::HasLink(const std::string& v) const {
         }
         case Network::ConnectionPoint::DvsPort: {
             const std::string dvs = Find("/network/dvswitches", _sim.String(_view, v + "/dvs"));
-            if (dvs.empty() || Find(dvs + "/ports", _sim.String(_view, v + "/port"), "key").empty())
-                return false;
+            if (dvs.empty()) return false;
+            const std::string port = Find(dvs + "/ports", _sim.String(_view, v + "/port"), "key");
+            if (port.empty()) return false;
+            // A blocked port passes nothing; a port limited to some uplinks
+            // reaches the network only through those.
+            const json& portObject = _view.at(json::json_pointer(port));
+            if (portObject.contains("blocked") && _sim.Bool(_view, port + "/blocked")) return false;
+            const bool limited = portObject.contains("uplinks");
+            const std::vector<std::string> allowed =
+                limited ? _sim.StringList(_view, port + "/uplinks") : std::vector<std::string>{};
             const std::string ports = dvs + "/uplinkPorts";
             for (size_t i = 0; i < _sim.Array(_view, ports).size(); ++i) {
+                const std::string key = _sim.String(_view, At(ports, i) + "/key");
+                if (limited && std::find(allowed.begin(), allowed.end(), key) == allowed.end()) continue;
                 const std::string pnic = _sim.String(_view, At(ports, i) + "/pnic");
                 if (!pnic.empty() && PnicHasLink(pnic)) return true;
             }
@@ -796,6 +806,23 @@ void NetworkModel::RemoveDvsUplink(const std::string& dvs, const std::string& pn
     Object(port)["pnic"] = "";
 }
 
+void NetworkModel::AddDvsUplink(const std::string& dvs, const std::string& uplinkPort,
+                                const std::string& pnic) {
+    const std::string d = DvsPointer(dvs);
+    PnicPointer(pnic);
+    const std::string port = Find(d + "/uplinkPorts", uplinkPort, "key");
+    if (port.empty())
+        throw HostCtlException("distributed switch \"" + dvs + "\" has no uplink port \"" + uplinkPort +
+                               "\"");
+    const std::string backing = _sim.String(_view, port + "/pnic");
+    if (!backing.empty())
+        throw HostCtlException("uplink port \"" + uplinkPort + "\" is already backed by \"" + backing + "\"");
+    const std::string owner = SwitchOfPnic(pnic);
+    if (!owner.empty())
+        throw HostCtlException("physical NIC \"" + pnic + "\" is already used by switch \"" + owner + "\"");
+    Object(port)["pnic"] = pnic;
+}
+
 void NetworkModel::SetConnectionPoint(const std::string& v, int type, const std::string& name) {
     const std::string vnic = _sim.String(_view, v + "/name");
     // The distributed port the interface leaves, when it is on one.
@@ -857,6 +884,22 @@ void NetworkModel::AddVirtualSwitch(const std::string& vswitch) {
                     {"portgroups", json::array()}});
 }
 
+void NetworkModel::RemoveVirtualSwitch(const std::string& vswitch) {
+    const std::string sw = VswitchPointer(vswitch);
+    const std::string vnics = "/network/vnics";
+    for (size_t i = 0; i < _sim.Array(_view, vnics).size(); ++i) {
+        const std::string v = ::HostCtl::Lib::At(vnics, i);
+        if (_sim.Integer(_view, v + "/connectionType") != Network::ConnectionPoint::PortGroup) continue;
+        if (!Find(sw + "/portgroups", _sim.String(_view, v + "/portgroup")).empty())
+            throw HostCtlException("switch \"" + vswitch + "\" is used by \"" +
+                                   _sim.String(_view, v + "/name") + "\"");
+    }
+    json kept = json::array();
+    for (const json& other : _sim.Array(_view, "/network/vswitches"))
+        if (!other.is_object() || other.value("name", "") != vswitch) kept.push_back(other);
+    At("/network/vswitches") = std::move(kept);
+}
+
 void NetworkModel::AddPortGroup(const std::string& vswitch, const std::string& portGroup, unsigned vlan) {
     const std::string sw = VswitchPointer(vswitch);
     if (portGroup.empty()) throw HostCtlException("a port group needs a name");
@@ -871,9 +914,15 @@ void NetworkModel::AddPortGroup(const std::string& vswitch, const std::string& p
     At(sw + "/portgroups").push_back({{"name", portGroup}, {"vlan", vlan}});
 }
 
-std::string NetworkModel::AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort) {
+std::string NetworkModel::AddDvsHostLocalPort(const std::string& dvs,
+                                              const Network::DistributedSwitch::PortSettings& settings) {
     const std::string d = DvsPointer(dvs);
-    json port = _sim.Object(_view, DvsPortPointer(d, fromPort));
+    if (settings.vlanId > 4095)
+        throw HostCtlException("VLAN ID " + std::to_string(settings.vlanId) + " is above 4095");
+    for (const std::string& uplink : settings.uplinks)
+        if (Find(d + "/uplinkPorts", uplink, "key").empty())
+            throw HostCtlException("distributed switch \"" + dvs + "\" has no uplink port \"" + uplink +
+                                   "\"");
     // A number above every numeric key of the switch's ports.
     uint64_t highest = 99;
     for (const char* list : {"/ports", "/uplinkPorts"}) {
@@ -884,11 +933,37 @@ std::string NetworkModel::AddDvsHostLocalPort(const std::string& dvs, const std:
         }
     }
     const std::string key = std::to_string(highest + 1);
-    port["key"] = key;
-    port["hostLocal"] = true;
-    port["connectee"] = "";
+    json port = {{"key", key},
+                 {"vlan", settings.vlanId},
+                 {"blocked", settings.blocked},
+                 {"hostLocal", true},
+                 {"connectee", ""}};
+    if (!settings.uplinks.empty()) port["uplinks"] = settings.uplinks;
     At(d + "/ports").push_back(std::move(port));
     return key;
+}
+
+void NetworkModel::RemoveDvsHostLocalPort(const std::string& dvs, const std::string& port) {
+    const std::string d = DvsPointer(dvs);
+    const std::string p = DvsPortPointer(d, port);
+    if (!_sim.Bool(_view, p + "/hostLocal"))
+        throw HostCtlException("port \"" + port + "\" of distributed switch \"" + dvs +
+                               "\" is not host-local");
+    std::string user = _sim.String(_view, p + "/connectee");
+    const std::string vnics = "/network/vnics";
+    for (size_t i = 0; i < _sim.Array(_view, vnics).size() && user.empty(); ++i) {
+        const std::string v = ::HostCtl::Lib::At(vnics, i);
+        if (_sim.Integer(_view, v + "/connectionType") == Network::ConnectionPoint::DvsPort &&
+            _sim.String(_view, v + "/dvs") == dvs && _sim.String(_view, v + "/port") == port)
+            user = _sim.String(_view, v + "/name");
+    }
+    if (!user.empty())
+        throw HostCtlException("port \"" + port + "\" of distributed switch \"" + dvs + "\" is used by \"" +
+                               user + "\"");
+    json kept = json::array();
+    for (const json& other : _sim.Array(_view, d + "/ports"))
+        if (!other.is_object() || other.value("key", "") != port) kept.push_back(other);
+    At(d + "/ports") = std::move(kept);
 }
 
 void NetworkModel::ClearConfig() {

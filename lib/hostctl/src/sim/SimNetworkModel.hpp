@@ -105,6 +105,8 @@ public:
     void RemoveUplink(const std::string& vswitch, const std::string& pnic);
     void SetPortGroupVlan(const std::string& vswitch, const std::string& portGroup, unsigned vlan);
     void RemoveDvsUplink(const std::string& dvs, const std::string& pnic);
+    // The NIC backs the free uplink port again; a NIC of any switch is refused.
+    void AddDvsUplink(const std::string& dvs, const std::string& uplinkPort, const std::string& pnic);
 
     // Connects the interface to a port group of a standard switch (type 1)
     // or to a free port of a distributed switch (type 2), whose connectee
@@ -113,11 +115,17 @@ public:
     void SetConnectionPoint(const std::string& vnicPointer, int type, const std::string& name);
     // A standard switch without uplinks or port groups.
     void AddVirtualSwitch(const std::string& vswitch);
+    // Refused while a virtual NIC is connected to one of its port groups.
+    void RemoveVirtualSwitch(const std::string& vswitch);
     // Port group names are unique on the host.
     void AddPortGroup(const std::string& vswitch, const std::string& portGroup, unsigned vlan);
-    // A copy of the port `fromPort` that lives on this host only, with a new
-    // key and nothing connected; returns the key.
-    std::string AddDvsHostLocalPort(const std::string& dvs, const std::string& fromPort);
+    // A port that lives on this host only, with a new key, the given
+    // properties and nothing connected; returns the key. Its uplinks must be
+    // uplink ports of the switch.
+    std::string AddDvsHostLocalPort(const std::string& dvs,
+                                    const Network::DistributedSwitch::PortSettings& settings);
+    // Refused for a port that is not host-local or that a virtual NIC uses.
+    void RemoveDvsHostLocalPort(const std::string& dvs, const std::string& port);
     // Removes every virtual NIC, standard and distributed switch, the
     // management interface name, the default gateways and the name servers
     // (running and saved); refused while the network core dump sender is

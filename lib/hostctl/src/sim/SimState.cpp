@@ -85,7 +85,8 @@ bool WriteAll(int fd, const std::string& data) {
 // - "dvswitches": distributed switches the host is a member of: uplink ports
 //   ({"key", "pnic"}, "pnic" "" when no NIC backs the port) and ports
 //   ({"key", "vlan", "hostLocal", "connectee"}: the virtual NIC on the port,
-//   or "").
+//   or ""; optional "blocked": the port passes nothing, and "uplinks": the
+//   keys of the only uplink ports its traffic may use).
 // - "ipv6Enabled": IPv6 in the running kernel; "ipv6EnabledAtBoot": what the
 //   next boot gives it.
 // - "dns", "routing": the running name service and default gateways
