@@ -95,6 +95,7 @@ private:
     static void RequestEnd(int event);
     static void ArmEmergencyExit();
     static bool EndOfInput();
+    static bool InputWaiting();
 
 protected:
     Frame* _parent;
