@@ -34,12 +34,15 @@ int main() {
                              "Reset System Configuration"};
     const int count = sizeof entries / sizeof entries[0];
     int current = 0;
-    bkgd(COLOR_PAIR(1));
+    // Without colours the highlight is in reverse video, as the console's.
+    const attr_t normal = has_colors() ? COLOR_PAIR(1) : A_NORMAL;
+    const attr_t highlight = has_colors() ? COLOR_PAIR(2) : A_REVERSE;
+    bkgd(normal);
     box(stdscr, 0, 0);
     mvaddstr(1, 3, "System Customization");
     for (;;) {
         for (int i = 0; i < count; ++i) {
-            attrset(i == current ? COLOR_PAIR(2) : COLOR_PAIR(1));
+            attrset(i == current ? highlight : normal);
             mvprintw(3 + i, 2, "%-36s", entries[i]);
         }
         refresh();

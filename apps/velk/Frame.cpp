@@ -207,7 +207,10 @@ int Frame::WaitForInput(struct timeval* timeout) {
     FD_ZERO(&fds);
     FD_SET(0, &fds);
     FD_SET(_signalPipe[0], &fds);
-    Window::Flush();
+    // Keys already waiting are all handled before the screen is written: a
+    // burst of keys or a paste is drawn once, with only its end result (over
+    // a serial line every byte costs time).
+    if (!InputWaiting()) Window::Flush();
     int n = select(std::max(0, _signalPipe[0]) + 1, &fds, nullptr, nullptr, timeout);
     if (n < 0) {
         LogError("select() failed");
@@ -321,6 +324,11 @@ void Frame::RequestEnd(int event) {
         pthread_t thread;
         if (pthread_create(&thread, nullptr, EmergencyExit, nullptr) == 0) pthread_detach(thread);
     }
+}
+
+bool Frame::InputWaiting() {
+    struct pollfd input = {0, POLLIN, 0};
+    return poll(&input, 1, 0) > 0 && (input.revents & POLLIN);
 }
 
 int Frame::EndOfInput() {

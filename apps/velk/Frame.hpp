@@ -101,6 +101,7 @@ private:
     // 0 while the terminal may still give keys; else the event that ends
     // the console (EV_HANGUP for a hung-up terminal).
     static int EndOfInput();
+    static bool InputWaiting();
 
 protected:
     Frame* _parent;

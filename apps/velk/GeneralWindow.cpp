@@ -3,8 +3,6 @@
 #include <syslog.h>
 
 #include <algorithm>
-#include <fstream>
-#include <sstream>
 
 #include "ChangePasswordDialog.hpp"
 #include "CommandRunner.hpp"
@@ -134,9 +132,7 @@ int GeneralWindow::SelectedId() const {
 
 std::vector<std::string> GeneralWindow::SplitPages(const std::string& text) {
     std::vector<std::string> pages(1);
-    std::istringstream in(text);
-    std::string line;
-    while (std::getline(in, line)) {
+    for (const std::string& line : HostCtl::Lib::Lines(text)) {
         if (line == "%%") {
             pages.emplace_back();
             continue;
@@ -150,15 +146,13 @@ std::vector<std::string> GeneralWindow::SplitPages(const std::string& text) {
 
 void GeneralWindow::LoadSupportPages() {
     const std::string path = HostCtl::Lib::HostPath(SUPPORT_INFO_PATH);
-    std::ifstream in(path);
-    std::ostringstream text;
-    if (in) text << in.rdbuf();
-    if (!in || in.bad()) {
+    std::string text;
+    if (!HostCtl::Lib::ReadText(path, text)) {
         HostCtl::Lib::Syslog(LOG_WARNING, "Support information %s cannot be read", SUPPORT_INFO_PATH);
         _pages = {"Support information is not available on this host."};
         return;
     }
-    _pages = SplitPages(text.str());
+    _pages = SplitPages(text);
 }
 
 std::string GeneralWindow::SupportPageDescription() const {

@@ -6,7 +6,6 @@
 
 #include <cstdio>
 #include <cstring>
-#include <sstream>
 
 #include "CommandRunner.hpp"
 #include "ManagementInterface.hpp"
@@ -98,10 +97,9 @@ std::string GetSshKeyFingerprint(const std::string& keyFile) {
         Syslog(LOG_INFO, "Error generating SSH Key Fingerprint: %s", result.err.c_str());
         return "";
     }
-    std::istringstream words(result.out);
-    std::string size, fingerprint, file;
-    words >> size >> fingerprint >> file;
-    return fingerprint;
+    // "<size> <fingerprint> <file> (<type>)"
+    const std::vector<std::string> words = HostCtl::Lib::Words(result.out);
+    return words.size() > 1 ? words[1] : "";
 }
 
 std::string GetCimProperty(const std::string& className, const std::string& propertyName) {

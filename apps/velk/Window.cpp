@@ -104,7 +104,11 @@ void Window::Refresh() {
 void Window::Flush() {
     // Nothing to write before curses starts or while the terminal is handed
     // to another program.
-    if (stdscr != nullptr && !isendwin()) doupdate();
+    if (stdscr == nullptr || isendwin()) return;
+    // A hidden cursor stays where the last change ended: taking it home
+    // after every update would cost bytes for nothing.
+    leaveok(newscr, !_cursor);
+    doupdate();
 }
 
 void Window::Redraw() {

@@ -113,7 +113,10 @@ int main(int argc, char** argv) {
     keypad(stdscr, TRUE);
     Velk::InitColors();
     Velk::DefineKeys();
-    refresh();
+    // The first screen clears the terminal and draws itself in one update;
+    // the blank standard screen goes into that update now, so that reading a
+    // key never refreshes it over what the screens drew.
+    wnoutrefresh(stdscr);
     if (COLS < Velk::kMinColumns || LINES < Velk::kMinLines) Velk::Frame::RefuseSmallTerminal();
 
     Velk::WelcomeWindow* welcome = new Velk::WelcomeWindow();

@@ -319,4 +319,43 @@ std::string UtcTimestamp() {
     return text;
 }
 
+std::vector<std::string> Words(std::string_view text) {
+    std::vector<std::string> words;
+    constexpr std::string_view kBlanks = " \t\n\v\f\r";
+    for (size_t at = text.find_first_not_of(kBlanks); at != std::string_view::npos;) {
+        const size_t end = text.find_first_of(kBlanks, at);
+        words.emplace_back(text.substr(at, end == std::string_view::npos ? end : end - at));
+        at = end == std::string_view::npos ? end : text.find_first_not_of(kBlanks, end);
+    }
+    return words;
+}
+
+std::vector<std::string> Lines(std::string_view text) {
+    std::vector<std::string> lines;
+    for (size_t at = 0; at < text.size();) {
+        const size_t end = text.find('\n', at);
+        lines.emplace_back(text.substr(at, end == std::string_view::npos ? end : end - at));
+        at = end == std::string_view::npos ? text.size() : end + 1;
+    }
+    return lines;
+}
+
+bool ReadText(const std::string& path, std::string& text) {
+    text.clear();
+    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd < 0) return false;
+    char buf[8192];
+    for (;;) {
+        const ssize_t n = read(fd, buf, sizeof buf);
+        if (n < 0 && errno == EINTR) continue;
+        if (n <= 0) {
+            close(fd);
+            if (n == 0) return true;
+            text.clear();
+            return false;
+        }
+        text.append(buf, size_t(n));
+    }
+}
+
 }  // namespace HostCtl::Lib

@@ -4,7 +4,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <sstream>
 #include <system_error>
 #include <vector>
 
@@ -68,15 +67,14 @@ std::string ReadWhole(const std::string& path, mode_t& mode) {
 // `changed` tells whether any line did.
 std::string WithoutName(const std::string& text, const std::string& hostName, bool& changed) {
     std::string out;
-    std::istringstream lines(text);
-    for (std::string line; std::getline(lines, line);) {
+    for (const std::string& line : HostCtl::Lib::Lines(text)) {
         const size_t hash = line.find('#');
-        std::istringstream fields(line.substr(0, hash));
-        std::string address, name;
-        fields >> address;
+        std::vector<std::string> fields = HostCtl::Lib::Words(std::string_view(line).substr(0, hash));
+        const std::string address = fields.empty() ? "" : fields[0];
         std::vector<std::string> kept;
         bool named = false;
-        while (fields >> name) {
+        for (size_t f = 1; f < fields.size(); ++f) {
+            const std::string& name = fields[f];
             if (SameName(name, hostName))
                 named = true;
             else

@@ -39,6 +39,32 @@ TEST_F(HostTest, HostPathMapsAbsolutePathsIntoTheRoot) {
     std::filesystem::current_path(cwd);
 }
 
+// The stream-free text helpers split as >> and std::getline do.
+TEST(TextHelpers, WordsLinesAndWholeFiles) {
+    using Split = std::vector<std::string>;
+    const struct {
+        std::string text;
+        Split words, lines;
+    } cases[] = {
+        {"", {}, {}},
+        {"one", {"one"}, {"one"}},
+        {" \t192.0.2.1\thost  alias \r\n\n# c\n",
+         {"192.0.2.1", "host", "alias", "#", "c"},
+         {" \t192.0.2.1\thost  alias \r", "", "# c"}},
+        {"\n\nlast", {"last"}, {"", "", "last"}},
+    };
+    for (const auto& c : cases) {
+        EXPECT_EQ(HostCtl::Lib::Words(c.text), c.words) << c.text;
+        EXPECT_EQ(HostCtl::Lib::Lines(c.text), c.lines) << c.text;
+    }
+    std::string text = "stale";
+    EXPECT_FALSE(HostCtl::Lib::ReadText("/nonexistent/file", text));
+    EXPECT_EQ(text, "");
+    EXPECT_FALSE(HostCtl::Lib::ReadText("/", text));  // a folder cannot be read
+    EXPECT_TRUE(HostCtl::Lib::ReadText("/proc/self/cmdline", text));
+    EXPECT_FALSE(text.empty());
+}
+
 TEST_F(HostTest, SyslogAppendsFacilityAndLevel) {
     HostCtl::Lib::OpenLog("VELK", LOG_PID, LOG_USER);
     Syslog(LOG_INFO, "Setting hostname to %s", "esx1");

@@ -6,6 +6,8 @@
 
 #include <cstdarg>
 #include <string>
+#include <string_view>
+#include <vector>
 
 namespace HostCtl::Lib {
 
@@ -59,5 +61,17 @@ void ReplaceFile(const std::string& path, const std::string& text, mode_t mode);
 // The time now as "2026-11-23T08:15:02.345Z" (UTC, milliseconds), the stamp
 // of the simulated host's log lines.
 std::string UtcTimestamp();
+
+// Text helpers that need no streams: the console links the C++ runtime
+// statically, and any stream would bring its whole locale machinery along.
+// The words of `text` separated by blanks, tabs and line ends (as >> reads
+// them in the C locale).
+std::vector<std::string> Words(std::string_view text);
+// The lines of `text` without their '\n', as std::getline gives them: none
+// after a final line end.
+std::vector<std::string> Lines(std::string_view text);
+// The whole file at `path` into `text`; false (and `text` empty) when it
+// cannot be opened or read.
+bool ReadText(const std::string& path, std::string& text);
 
 }  // namespace HostCtl::Lib

@@ -9,10 +9,8 @@
 #include <array>
 #include <cerrno>
 #include <cstdio>
-#include <fstream>
 #include <optional>
 #include <set>
-#include <sstream>
 #include <system_error>
 
 #include "SimNetworkModel.hpp"
@@ -396,14 +394,13 @@ std::vector<IpAddress> NetworkView::FromHostsFile(const std::string& name) const
     // A host without a hosts file (or an unreadable one) asks DNS, as
     // resolvers do.
     std::vector<IpAddress> found;
-    std::ifstream in(_sim.Root() + "/etc/hosts");
-    for (std::string line; std::getline(in, line);) {
-        std::istringstream fields(line.substr(0, line.find('#')));
-        std::string address, alias;
-        fields >> address;
+    std::string text;
+    Lib::ReadText(_sim.Root() + "/etc/hosts", text);
+    for (const std::string& line : Lib::Lines(text)) {
+        const std::vector<std::string> fields = Lib::Words(std::string_view(line).substr(0, line.find('#')));
         bool named = false;
-        while (fields >> alias) named = named || SameName(alias, name);
-        if (named && IsIpText(address)) AddOnce(found, IpAddress(address));
+        for (size_t f = 1; f < fields.size(); ++f) named = named || SameName(fields[f], name);
+        if (named && IsIpText(fields[0])) AddOnce(found, IpAddress(fields[0]));
     }
     return found;
 }
@@ -1092,17 +1089,16 @@ void SyncHostsFile(const std::string& root, const json& state, const std::vector
 
     std::string text;
     {
-        std::ifstream in(path);
+        std::string old;
         struct stat st;
-        if (!in && stat(path.c_str(), &st) == 0) throw fail("cannot read", EACCES);
+        if (!Lib::ReadText(path, old) && stat(path.c_str(), &st) == 0) throw fail("cannot read", EACCES);
         bool placed = false;
-        for (std::string line; std::getline(in, line);) {
-            std::istringstream fields(line.substr(0, line.find('#')));
-            std::string address, name;
-            fields >> address;
+        for (const std::string& line : Lib::Lines(old)) {
+            const std::vector<std::string> fields =
+                Lib::Words(std::string_view(line).substr(0, line.find('#')));
             bool ours = false;
-            while (fields >> name) ours = ours || names.count(name);
-            if (ours && !IsLoopback(address)) {
+            for (size_t f = 1; f < fields.size(); ++f) ours = ours || names.count(fields[f]);
+            if (ours && !IsLoopback(fields[0])) {
                 if (!placed && !entry.empty()) text += entry + "\n";
                 placed = true;
                 continue;

@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <climits>
 #include <system_error>
@@ -247,17 +248,21 @@ json SimState::Load(Identity& identity, bool mustExist) const {
     if (fstat(fd.get(), &st) < 0) throw Error("cannot read: " + ErrnoText(errno));
     identity = {st.st_dev, st.st_ino, st.st_size, st.st_mtim};
 
-    std::string text;
-    char buf[65536];
+    // Read straight into the text: a big buffer on the stack would leave the
+    // pages below it, which the parser's calls then use, resident for good.
+    std::string text(static_cast<size_t>(std::max<off_t>(st.st_size, 0)) + 1, '\0');
+    size_t used = 0;
     for (;;) {
-        ssize_t n = read(fd.get(), buf, sizeof buf);
+        if (used == text.size()) text.resize(text.size() * 2);
+        ssize_t n = read(fd.get(), text.data() + used, text.size() - used);
         if (n < 0) {
             if (errno == EINTR) continue;
             throw Error("cannot read: " + ErrnoText(errno));
         }
         if (n == 0) break;
-        text.append(buf, size_t(n));
+        used += size_t(n);
     }
+    text.resize(used);
 
     if (JsonTextDepth(text, kMaxStateDepth) > kMaxStateDepth)
         throw Error("arrays and objects nested deeper than " + std::to_string(kMaxStateDepth) + " levels");
