@@ -21,10 +21,8 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <fstream>
 #include <functional>
 #include <memory>
-#include <sstream>
 
 #include "hostctl/Host.hpp"
 #include "hostctl/HostCtl.hpp"
@@ -80,9 +78,9 @@ using Cache = std::unique_ptr<nl_cache, CacheDeleter>;
 
 // The first line of a sysfs file without its line end; "" when it cannot be read.
 std::string ReadLine(const std::string& path) {
-    std::ifstream in(HostPath(path));
-    std::string line;
-    if (!in || !std::getline(in, line)) return "";
+    std::string text;
+    if (!ReadText(HostPath(path), text)) return "";
+    std::string line = text.substr(0, text.find('\n'));
     while (!line.empty() && (line.back() == '\n' || line.back() == '\r' || line.back() == ' '))
         line.pop_back();
     return line;
@@ -103,9 +101,10 @@ bool Exists(const std::string& path) { return access(HostPath(path).c_str(), F_O
 // A property of udev's database entry for a network interface ("E:KEY=value"
 // lines of /run/udev/data/n<ifindex>); "" when udev has none.
 std::string UdevProperty(int index, const std::string& key) {
-    std::ifstream in(HostPath("/run/udev/data/n" + std::to_string(index)));
+    std::string text;
+    ReadText(HostPath("/run/udev/data/n" + std::to_string(index)), text);
     const std::string prefix = "E:" + key + "=";
-    for (std::string line; std::getline(in, line);)
+    for (const std::string& line : Lines(text))
         if (line.compare(0, prefix.size(), prefix) == 0) return line.substr(prefix.size());
     return "";
 }

@@ -15,13 +15,10 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <map>
 #include <mutex>
-#include <set>
-#include <sstream>
-
 #include <nlohmann/json.hpp>
+#include <set>
 
 #include "HostConfig.hpp"
 #include "HostShell.hpp"
@@ -48,12 +45,10 @@ using Network::Ipv6Network;
 const char* const NO_DVS = "a Debian host has no distributed switches";
 
 // A file's whole text, or nothing when it cannot be read.
-std::optional<std::string> ReadText(const std::string& hostPath) {
-    std::ifstream in(HostPath(hostPath), std::ios::binary);
-    if (!in) return std::nullopt;
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
+std::optional<std::string> ReadHostText(const std::string& hostPath) {
+    std::string text;
+    if (!ReadText(HostPath(hostPath), text)) return std::nullopt;
+    return text;
 }
 
 std::string Trim(const std::string& text) {
@@ -63,22 +58,14 @@ std::string Trim(const std::string& text) {
 }
 
 std::string FirstLine(const std::string& hostPath) {
-    const std::string text = ReadText(hostPath).value_or("");
+    const std::string text = ReadHostText(hostPath).value_or("");
     return Trim(text.substr(0, text.find('\n')));
-}
-
-std::vector<std::string> Words(const std::string& line) {
-    std::istringstream in(line);
-    std::vector<std::string> words;
-    for (std::string w; in >> w;) words.push_back(w);
-    return words;
 }
 
 // "KEY=value" and "KEY="quoted value"" lines (os-release, /etc/default files).
 std::map<std::string, std::string> ShellAssignments(const std::string& text) {
     std::map<std::string, std::string> values;
-    std::istringstream in(text);
-    for (std::string line; std::getline(in, line);) {
+    for (std::string line : Lines(text)) {
         line = Trim(line);
         const size_t eq = line.find('=');
         if (line.empty() || line[0] == '#' || eq == std::string::npos) continue;
@@ -100,8 +87,7 @@ struct Resolver {
 
 Resolver ReadResolver() {
     Resolver r;
-    std::istringstream in(ReadText("/etc/resolv.conf").value_or(""));
-    for (std::string line; std::getline(in, line);) {
+    for (std::string line : Lines(ReadHostText("/etc/resolv.conf").value_or(""))) {
         std::vector<std::string> w = Words(line);
         if (w.size() < 2) continue;
         if (w[0] == "nameserver") {
@@ -123,8 +109,7 @@ Resolver ReadResolver() {
 // The hosts file's lines as address and names.
 std::vector<std::vector<std::string>> HostsEntries() {
     std::vector<std::vector<std::string>> entries;
-    std::istringstream in(ReadText("/etc/hosts").value_or(""));
-    for (std::string line; std::getline(in, line);) {
+    for (std::string line : Lines(ReadHostText("/etc/hosts").value_or(""))) {
         std::vector<std::string> w = Words(line.substr(0, line.find('#')));
         if (w.size() >= 2) entries.push_back(std::move(w));
     }
@@ -212,8 +197,7 @@ const Layout LAYOUTS[] = {
 std::string WithAssignments(const std::string& text, const std::map<std::string, std::string>& values) {
     std::set<std::string> done;
     std::string out;
-    std::istringstream in(text);
-    for (std::string line; std::getline(in, line);) {
+    for (std::string line : Lines(text)) {
         const std::string t = Trim(line);
         const size_t eq = t.find('=');
         if (eq != std::string::npos && t[0] != '#' && values.count(t.substr(0, eq))) {
@@ -433,7 +417,7 @@ public:
 
     VersionRecord GetVersionRecord() override {
         const std::map<std::string, std::string> os =
-            ShellAssignments(ReadText("/etc/os-release").value_or(""));
+            ShellAssignments(ReadHostText("/etc/os-release").value_or(""));
         utsname u{};
         uname(&u);
         VersionRecord record;
@@ -455,15 +439,13 @@ public:
 
     unsigned GetCpuPackages() override {
         std::set<std::string> packages;
-        std::istringstream in(ReadText("/proc/cpuinfo").value_or(""));
-        for (std::string line; std::getline(in, line);)
+        for (std::string line : Lines(ReadHostText("/proc/cpuinfo").value_or("")))
             if (line.rfind("physical id", 0) == 0) packages.insert(Trim(line.substr(line.find(':') + 1)));
         return unsigned(std::max<size_t>(1, packages.size()));
     }
 
     std::string GetCpuModel() override {
-        std::istringstream in(ReadText("/proc/cpuinfo").value_or(""));
-        for (std::string line; std::getline(in, line);)
+        for (std::string line : Lines(ReadHostText("/proc/cpuinfo").value_or("")))
             if (line.rfind("model name", 0) == 0) return Trim(line.substr(line.find(':') + 1));
         return "";
     }
@@ -666,8 +648,10 @@ public:
         for (const char* scope : {"all", "default"}) {
             const std::string path =
                 HostPath(std::string("/proc/sys/net/ipv6/conf/") + scope + "/disable_ipv6");
-            std::ofstream out(path);
-            out << (enabled ? "0\n" : "1\n");
+            const int fd = open(path.c_str(), O_WRONLY | O_CLOEXEC);
+            if (fd < 0 || write(fd, enabled ? "0\n" : "1\n", 2) != 2)
+                Syslog(LOG_WARNING, "Setting %s: %s", path.c_str(), std::strerror(errno));
+            if (fd >= 0) close(fd);
         }
     }
 
@@ -693,7 +677,8 @@ public:
     // The factory restore's way back: the files as they were, applied again
     // to the interface that had the management address.
     std::string GetNetworkConfig() override {
-        return nlohmann::json{{"iface", NetworkModel(Configuration()).ManagementInterface()}, {"files", SavedFiles()}}
+        return nlohmann::json{{"iface", NetworkModel(Configuration()).ManagementInterface()},
+                              {"files", SavedFiles()}}
             .dump();
     }
     void SetNetworkConfig(const std::string& config) override {
@@ -738,10 +723,12 @@ public:
     void AddDvsUplink(const std::string&, const std::string&, const std::string&) override {
         Refuse("adding a distributed switch's uplink", NO_DVS);
     }
-    Network::DistributedSwitch::PortSettings GetDvsPortSettings(const std::string&, const std::string&) override {
+    Network::DistributedSwitch::PortSettings GetDvsPortSettings(const std::string&,
+                                                                const std::string&) override {
         Refuse("reading a distributed port's settings", NO_DVS);
     }
-    std::string AddDvsHostLocalPort(const std::string&, const Network::DistributedSwitch::PortSettings&) override {
+    std::string AddDvsHostLocalPort(const std::string&,
+                                    const Network::DistributedSwitch::PortSettings&) override {
         Refuse("creating a host-local distributed port", NO_DVS);
     }
     void RemoveDvsHostLocalPort(const std::string&, const std::string&) override {
@@ -761,7 +748,7 @@ public:
         const std::string fqdn = domain.empty() ? hostname : hostname + "." + domain;
         // The hosts file first: the name must keep resolving to the management
         // address the moment the kernel's name changes.
-        std::string hosts = ReadText("/etc/hosts").value_or("");
+        std::string hosts = ReadHostText("/etc/hosts").value_or("");
         ReplaceSystemFile("/etc/hosts", HostsWithName(hosts, oldShort, hostname, fqdn));
         if (persist) ReplaceSystemFile("/etc/hostname", hostname + "\n");
         if (sethostname(hostname.c_str(), hostname.size()) != 0)
@@ -797,10 +784,10 @@ public:
     // System.
 
     std::string GetWelcomeMessage() override {
-        return ReadText(Configuration().welcomeMessageFile).value_or("");
+        return ReadHostText(Configuration().welcomeMessageFile).value_or("");
     }
 
-    std::string GetSystemAlert() override { return ReadText(ALERT_FILE).value_or(""); }
+    std::string GetSystemAlert() override { return ReadHostText(ALERT_FILE).value_or(""); }
 
     void SetSystemAlert(const std::string& alert) override {
         mkdir(HostPath("/run/velk").c_str(), 0755);
@@ -810,7 +797,7 @@ public:
     QelCtl::System::BootOptions GetBootOptions() override { return {}; }
 
     std::string GetKeyboardLayout() override {
-        const auto values = ShellAssignments(ReadText(KEYBOARD_FILE).value_or(""));
+        const auto values = ShellAssignments(ReadHostText(KEYBOARD_FILE).value_or(""));
         const std::string layout = values.count("XKBLAYOUT") ? values.at("XKBLAYOUT") : "us";
         const std::string variant = values.count("XKBVARIANT") ? values.at("XKBVARIANT") : "";
         for (const Layout& l : LAYOUTS)
@@ -820,7 +807,7 @@ public:
 
     void SetKeyboardLayout(const std::string& layout) override {
         const Layout& l = FindLayout(layout);
-        const std::string text = ReadText(KEYBOARD_FILE).value_or("");
+        const std::string text = ReadHostText(KEYBOARD_FILE).value_or("");
         ReplaceSystemFile(KEYBOARD_FILE,
                           WithAssignments(text, {{"XKBLAYOUT", l.xkbLayout}, {"XKBVARIANT", l.xkbVariant}}));
     }
@@ -975,8 +962,7 @@ private:
     static std::string HostsWithName(const std::string& text, const std::string& oldShort,
                                      const std::string& hostname, const std::string& fqdn) {
         std::string out;
-        std::istringstream in(text);
-        for (std::string line; std::getline(in, line);) {
+        for (std::string line : Lines(text)) {
             const std::string body = line.substr(0, line.find('#'));
             std::vector<std::string> w = Words(body);
             bool names = false;
@@ -1009,7 +995,7 @@ private:
                                                                                : "resolvconf") +
                        " (a link to " + target + "); change them there");
         }
-        const std::string text = ReadText("/etc/resolv.conf").value_or("");
+        const std::string text = ReadHostText("/etc/resolv.conf").value_or("");
         Resolver r = ReadResolver();
         edit(r);
         std::string out;
@@ -1025,8 +1011,7 @@ private:
             for (const Ipv4Address& s : r.servers) out += "nameserver " + s.GetStringAddress() + "\n";
             for (const Ipv6Address& s : r.ipv6Servers) out += "nameserver " + s.GetStringAddress() + "\n";
         };
-        std::istringstream in(text);
-        for (std::string line; std::getline(in, line);) {
+        for (std::string line : Lines(text)) {
             const std::vector<std::string> w = Words(line);
             if (!w.empty() && (w[0] == "nameserver" || w[0] == "search")) {
                 writeOwned();  // where the first owned line was

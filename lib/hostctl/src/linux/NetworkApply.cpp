@@ -8,9 +8,8 @@
 #include <algorithm>
 #include <chrono>
 #include <filesystem>
-#include <thread>
-
 #include <nlohmann/json.hpp>
+#include <thread>
 
 #include "HostShell.hpp"
 #include "LinkState.hpp"
@@ -389,8 +388,8 @@ void PutBackFiles(const std::string& saved, const std::string& iface) {
             ReplaceFile(HostPath(f.at("path").get<std::string>()), f.at("text").get<std::string>(),
                         f.at("mode").get<mode_t>());
     } catch (const nlohmann::json::exception& e) {
-        throw HostCtlException(std::string("putting back the network configuration: not a saved configuration: ") +
-                               e.what());
+        throw HostCtlException(
+            std::string("putting back the network configuration: not a saved configuration: ") + e.what());
     }
     SetInterfaceUp(iface, false);
     SetInterfaceUp(iface, true);
