@@ -95,7 +95,7 @@ int ExitStatus(int status) {
 
 }  // namespace
 
-int RunBounded(const std::vector<std::string>& args, int timeoutMs, std::string* output) {
+int RunBounded(const std::vector<std::string>& args, int timeoutMs, std::string* output, size_t maxOutput) {
     if (args.empty()) throw HostCtlException("no program to run");
     int fds[2] = {-1, -1};
     if (pipe2(fds, O_CLOEXEC) != 0)
@@ -132,7 +132,7 @@ int RunBounded(const std::vector<std::string>& args, int timeoutMs, std::string*
     auto drain = [&] {
         char buf[4096];
         for (ssize_t n; open && (n = read(fds[0], buf, sizeof buf)) > 0;)
-            if (text.size() < 65536) text.append(buf, size_t(n));
+            if (text.size() < maxOutput) text.append(buf, size_t(n));
     };
     for (;;) {
         int status = 0;
@@ -159,7 +159,7 @@ int RunBounded(const std::vector<std::string>& args, int timeoutMs, std::string*
             char buf[4096];
             const ssize_t n = read(fds[0], buf, sizeof buf);
             if (n == 0) open = false;
-            if (n > 0 && text.size() < 65536) text.append(buf, size_t(n));
+            if (n > 0 && text.size() < maxOutput) text.append(buf, size_t(n));
         }
     }
 }

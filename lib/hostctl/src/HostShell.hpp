@@ -23,8 +23,9 @@ int RunHostShell(const std::string& commandLine, bool logOutput, bool wait);
 // inherited, for at most `timeoutMs`: then its whole process group is killed
 // and the result is -1. Otherwise the result is its exit status (128 + the
 // signal number when a signal ended it). Its output (standard output and
-// error together, at most 64 KiB) goes to `output` when given. Throws
-// HostCtlException when it cannot be started.
-int RunBounded(const std::vector<std::string>& argv, int timeoutMs, std::string* output = nullptr);
+// error together, at most `maxOutput` bytes) goes to `output` when given.
+// Throws HostCtlException when it cannot be started.
+int RunBounded(const std::vector<std::string>& argv, int timeoutMs, std::string* output = nullptr,
+               size_t maxOutput = 65536);
 
 }  // namespace HostCtl::Lib

@@ -363,15 +363,20 @@ public:
         const AddressInfo* v4 = nullptr;
         std::vector<Ipv6Network> v6;
         bool dynamic6 = false;
+        bool slaac = false;
         for (const AddressInfo* a : _net.AddressesOf(link.index)) {
             if (!a->ipv6) {
                 if (v4 == nullptr) v4 = a;
                 continue;
             }
+            // The kernel's own link-local address is no address to manage
+            // the host from, nor one to configure.
+            if (Ipv6Address(a->address).IsLinkLocal()) continue;
             Ipv6AddressType type = Ipv6AddressType::Static;
-            if (a->proto == 3 /* IFAPROT_KERNEL_RA */ ||
+            if (a->proto == 2 /* IFAPROT_KERNEL_RA */ ||
                 (!a->Permanent() && a->prefixLength == 64 && a->proto == 0 && Autoconf(link.name))) {
                 type = Ipv6AddressType::Autoconf;
+                slaac = true;
             } else if (!a->Permanent()) {
                 type = Ipv6AddressType::Dhcp;
                 dynamic6 = true;
@@ -388,7 +393,11 @@ public:
             config.SetIpv4Netmask(Netmask(v4->prefixLength));
         }
         config.SetIpv6Network(v6);
-        config.SetUseIpv6RouterAdvertised(Autoconf(link.name) || _methods.inet6 == "auto");
+        // Router advertisements count when the stanza asks for them, or
+        // when the kernel made addresses from them.
+        config.SetUseIpv6RouterAdvertised(
+            _methods.inet6 == "auto" || slaac ||
+            (_methods.inet6 != "" && _methods.inet6 != "manual" && Autoconf(link.name)));
         config.SetUseIpv6Dhcp(dynamic6 || _methods.inet6 == "dhcp");
         config.SetDhcpDns(config.GetUseDhcp() || dynamic6);
         return config;
@@ -428,9 +437,12 @@ public:
                              ? point
                              : (os.count("VERSION_ID") ? os.at("VERSION_ID") : "");
         record.kernelRelease = u.release;
-        record.build = u.version;
         // The kernel's build count: "#1 SMP PREEMPT_DYNAMIC Debian ...".
-        if (u.version[0] == '#') record.buildNumber = uint32_t(std::strtoul(u.version + 1, nullptr, 10));
+        record.build = u.version;
+        if (u.version[0] == '#') {
+            record.buildNumber = uint32_t(std::strtoul(u.version + 1, nullptr, 10));
+            record.build = std::to_string(record.buildNumber);
+        }
         return record;
     }
 
