@@ -375,7 +375,8 @@ void ApplyFactoryLayout(const std::string& oldIface, const std::string& bridge, 
 
 std::string SavedFiles() {
     nlohmann::json files = nlohmann::json::array();
-    for (const auto& f : InterfacesFiles().Files())
+    const InterfacesFiles read;
+    for (const auto& f : read.Files())
         files.push_back({{"path", f.path}, {"mode", f.mode}, {"text", f.original}});
     return files.dump();
 }
