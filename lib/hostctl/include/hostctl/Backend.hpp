@@ -82,6 +82,19 @@ public:
     // once does nothing here.
     virtual void BeginNetworkChange() {}
     virtual void CommitNetworkChange() {}
+    // Before a static IPv4 address is set on `vnic`: whether another machine
+    // on its link already uses `address`. Returns who answered (a MAC address
+    // or a machine's name), or nothing when the address is free. Bounded
+    // (a few seconds); sends nothing beyond the interface's own link.
+    virtual std::optional<std::string> ProbeIpv4Address(const std::string& vnic,
+                                                        const Network::Ipv4Address& address) = 0;
+    // The checks of the management interface `vnic` after a change, each
+    // bounded: link on a physical uplink, every configured address present
+    // and not a duplicate, the IPv4 and IPv6 default gateways answer on the
+    // link, and each name server answers a query for the host's own name (a
+    // warning when it does not, never a failure). Every check is listed, in
+    // that order, passed or not.
+    virtual std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string& vnic) = 0;
     // IPv6 in the running kernel; the setter decides the next boot.
     virtual bool GetIpv6Enabled() = 0;
     virtual void SetIpv6Enabled(bool enabled) = 0;

@@ -145,6 +145,56 @@ private:
     std::string _mgmtName;
 };
 
+// One check of the management network after a change.
+struct NetworkCheck {
+    enum class Outcome { Passed, Failed, Warning };
+    // What was checked, in a few words ("link of eno1", "address
+    // 192.0.2.10", "gateway 192.0.2.1", "name server 192.0.2.53").
+    std::string subject;
+    Outcome outcome = Outcome::Passed;
+    // Why it did not pass ("no carrier", "no answer", "duplicate address");
+    // empty when it passed.
+    std::string detail;
+};
+
+// A change of the management network on trial. Before the change the
+// present configuration is saved with a marker (one file under
+// "/var/lib/velk/", written atomically); after it, the checks tell whether
+// the host is still reachable; the change is then kept (the marker goes) or
+// the saved configuration is put back. A marker found when the console
+// starts belongs to a console that ended in between: the saved
+// configuration is put back before anything else.
+class NetworkTrialImpl {
+public:
+    // Throws HostCtlException naming who answered when another machine on
+    // the management interface's link already uses `address`.
+    void ProbeAddress(const HostCtl::Network::Ipv4Address& address);
+    // Saves the present network configuration (files and running state)
+    // with the marker, `user` recorded as who changes it. Throws
+    // HostCtlException when it cannot be saved; nothing is then changed.
+    void Save(const std::string& user);
+    // Whether a saved change is neither kept nor reverted.
+    bool IsPending();
+    // The checks of the management interface, in order (see
+    // Backend::CheckNetwork); bounded.
+    std::vector<NetworkCheck> Check();
+    // True when no check failed (warnings pass).
+    static bool Passed(const std::vector<NetworkCheck>& checks);
+    // The change stays: the marker goes.
+    void Keep();
+    // Puts the saved configuration back and applies it, then drops the
+    // marker. Throws HostCtlException when it cannot be put back (the marker
+    // then stays).
+    void Revert();
+    // The management network in one line for the audit: addresses, VLAN,
+    // adapters, name servers, host name.
+    std::string Describe();
+    // What Describe said when the configuration was saved, and who saved it
+    // ("" when nothing is pending).
+    std::string SavedDescription();
+    std::string SavedBy();
+};
+
 // Host name, domain, name servers and search domains of one network stack.
 // Setters with a `persist` flag change the running configuration and, when
 // the flag is set, the saved one too; SaveConfig saves all of it. What is not
