@@ -593,6 +593,13 @@ public:
     // setter is a change of its own.
 
     void BeginNetworkChange() override { _pending.emplace(); }
+    // Placeholders until the checks are built.
+    std::optional<std::string> ProbeIpv4Address(const std::string&, const Network::Ipv4Address&) override {
+        throw HostCtlException("not built yet");
+    }
+    std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string&) override {
+        throw HostCtlException("not built yet");
+    }
 
     void CommitNetworkChange() override {
         if (!_pending) return;

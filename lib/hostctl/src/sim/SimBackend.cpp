@@ -523,6 +523,14 @@ public:
         return fields;
     }
 
+    // Placeholders until the checks are built.
+    std::optional<std::string> ProbeIpv4Address(const std::string&, const Network::Ipv4Address&) override {
+        throw HostCtlException("not built yet");
+    }
+    std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string&) override {
+        throw HostCtlException("not built yet");
+    }
+
     std::string GetNetworkConfig() override {
         return Reading("GetNetworkConfig", [&](const json& s) {
             json config = json::object();
