@@ -374,6 +374,7 @@ TEST_F(SimBackendTest, NetworkTrialSavesKeepsAndReverts) {
         dns.RemoveNameServers();
         dns.AddNameServer(IpAddress("198.51.100.53"));
         QelCtl::Network::RoutingInfoImpl(STACK).SetQelKernelDefaultGateway(Ipv4Address("198.51.100.1"), true);
+        network.SetQelIpv6Enabled(false);
     };
 
     EXPECT_FALSE(trial.IsPending());

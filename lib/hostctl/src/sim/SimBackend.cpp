@@ -531,7 +531,8 @@ public:
     }
 
     // The fields ClearNetworkConfig changes and those the network settings
-    // change besides (host name, domain, search domains), by JSON pointer.
+    // change besides (host name, domain, search domains, IPv6 at the next
+    // boot), by JSON pointer.
     static const std::vector<std::string>& NetworkConfigFields() {
         static const std::vector<std::string> fields = {"/network/vnics",
                                                         "/network/vswitches",
@@ -548,7 +549,8 @@ public:
                                                         "/network/dns/searchDomains",
                                                         "/network/saved/dns/hostname",
                                                         "/network/saved/dns/domain",
-                                                        "/network/saved/dns/searchDomains"};
+                                                        "/network/saved/dns/searchDomains",
+                                                        "/network/ipv6EnabledAtBoot"};
         return fields;
     }
 
