@@ -15,6 +15,7 @@
 #include <cerrno>
 #include <cstring>
 #include <filesystem>
+#include <future>
 #include <map>
 #include <mutex>
 #include <nlohmann/json.hpp>
@@ -25,6 +26,7 @@
 #include "LinkState.hpp"
 #include "LinuxPaths.hpp"
 #include "NetworkApply.hpp"
+#include "NetworkChecks.hpp"
 #include "hostctl/Host.hpp"
 
 namespace HostCtl::Lib::Linux {
@@ -115,6 +117,16 @@ std::vector<std::vector<std::string>> HostsEntries() {
     }
     return entries;
 }
+
+// The kernel's host name as it is, domain and all.
+std::string NodeName() {
+    utsname u{};
+    uname(&u);
+    return u.nodename;
+}
+
+// The files besides the interfaces files that the network window changes.
+const char* const HOST_FILES[] = {"/etc/hostname", "/etc/hosts", "/etc/resolv.conf"};
 
 std::string ShortHostName() {
     utsname u{};
@@ -593,12 +605,59 @@ public:
     // setter is a change of its own.
 
     void BeginNetworkChange() override { _pending.emplace(); }
-    // Placeholders until the checks are built.
-    std::optional<std::string> ProbeIpv4Address(const std::string&, const Network::Ipv4Address&) override {
-        throw HostCtlException("not built yet");
+
+    std::optional<std::string> ProbeIpv4Address(const std::string& vnic,
+                                                const Ipv4Address& address) override {
+        return ProbeIpv4(vnic, address.GetStringAddress());
     }
-    std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string&) override {
-        throw HostCtlException("not built yet");
+
+    std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string& vnic) override {
+        NetworkModel model(Configuration());
+        const int index = model.Link(vnic).index;
+        const std::string vswitch = model.SwitchOf(vnic);
+        const Network::TeamingPolicy team = model.Team(vswitch);
+        std::vector<std::string> uplinks = team.activeUplinks;
+        uplinks.insert(uplinks.end(), team.standbyUplinks.begin(), team.standbyUplinks.end());
+        std::vector<NetworkCheck> checks = CheckLinks(vswitch, uplinks);
+
+        // What the files give the interface, then what the kernel learned
+        // (a lease's or a router advertisement's gateway).
+        std::vector<std::string> addresses, gateways;
+        const InterfacesFiles files;
+        for (const auto& place : files.FindIface(vnic)) {
+            const InterfacesFile& file = files.Files()[place.file].file;
+            const auto& stanza = file.Stanzas()[place.stanza];
+            if (stanza.Method() != "static" && !stanza.Family().empty()) continue;
+            for (const std::string& a : file.OptionValues(place.stanza, "address"))
+                addresses.push_back(a.substr(0, a.find('/')));
+            for (const std::string& g : file.OptionValues(place.stanza, "gateway"))
+                gateways.push_back(CanonicalAddress(g));
+        }
+        const bool dhcp4 = ConfiguredMethod(files, vnic, "inet") == "dhcp";
+        for (NetworkCheck& c : CheckAddresses(vnic, addresses, dhcp4)) checks.push_back(std::move(c));
+        for (const RouteInfo& r : ReadNetwork().routes)
+            if (r.prefixLength == 0 && r.linkIndex == index && !r.gateway.empty() &&
+                std::find(gateways.begin(), gateways.end(), CanonicalAddress(r.gateway)) == gateways.end())
+                gateways.push_back(CanonicalAddress(r.gateway));
+
+        // The gateways, then the name servers (a query must not race the
+        // gateway's dropped neighbour entry), each set at once: a silent one
+        // costs its own wait, not the others'.
+        std::vector<std::future<NetworkCheck>> pending;
+        for (const std::string& g : gateways)
+            pending.push_back(std::async(std::launch::async, [&vnic, g] { return CheckGateway(vnic, g); }));
+        for (auto& p : pending) checks.push_back(p.get());
+        pending.clear();
+        const Resolver resolver = ReadResolver();
+        const std::string domain = HostDomain();
+        const std::string name = ShortHostName() + (domain.empty() ? "" : "." + domain);
+        std::vector<std::string> servers;
+        for (const Ipv4Address& s : resolver.servers) servers.push_back(s.GetStringAddress());
+        for (const Ipv6Address& s : resolver.ipv6Servers) servers.push_back(s.GetStringAddress());
+        for (const std::string& s : servers)
+            pending.push_back(std::async(std::launch::async, [s, name] { return CheckNameServer(s, name); }));
+        for (auto& p : pending) checks.push_back(p.get());
+        return checks;
     }
 
     void CommitNetworkChange() override {
@@ -693,23 +752,54 @@ public:
         ApplyFactoryLayout(mgmt, bridge, uplink, nics);
     }
 
-    // The factory restore's way back: the files as they were, applied again
-    // to the interface that had the management address.
+    // What the network window changes, saved as a whole and put back as a
+    // whole: the interfaces files, the host name (running and saved), the
+    // hosts file and the resolver file (each of the three only when it is a
+    // file of its own, not a link another program manages).
     std::string GetNetworkConfig() override {
-        return nlohmann::json{{"iface", NetworkModel(Configuration()).ManagementInterface()},
-                              {"files", SavedFiles()}}
-            .dump();
+        nlohmann::json saved{{"iface", NetworkModel(Configuration()).ManagementInterface()},
+                             {"files", SavedFiles()},
+                             {"nodename", NodeName()},
+                             {"hostFiles", nlohmann::json::array()}};
+        for (const char* path : HOST_FILES) {
+            struct stat st {};
+            std::optional<std::string> text = ReadHostText(path);
+            if (lstat(HostPath(path).c_str(), &st) == 0 && S_ISREG(st.st_mode) && text)
+                saved["hostFiles"].push_back({{"path", path}, {"mode", st.st_mode & 07777}, {"text", *text}});
+        }
+        return saved.dump();
     }
     void SetNetworkConfig(const std::string& config) override {
-        std::string iface, files;
+        std::string iface, files, nodename;
+        struct HostFile {
+            std::string path, text;
+            mode_t mode;
+        };
+        std::vector<HostFile> hostFiles;
         try {
             const nlohmann::json saved = nlohmann::json::parse(config);
             iface = saved.at("iface").get<std::string>();
             files = saved.at("files").get<std::string>();
+            nodename = saved.value("nodename", "");
+            for (const auto& f : saved.value("hostFiles", nlohmann::json::array())) {
+                const std::string path = f.at("path").get<std::string>();
+                if (std::find(std::begin(HOST_FILES), std::end(HOST_FILES), path) == std::end(HOST_FILES))
+                    throw HostCtlException("putting back the network configuration: " + path +
+                                           " is no file of the network's");
+                hostFiles.push_back({path, f.at("text").get<std::string>(), f.at("mode").get<mode_t>()});
+            }
         } catch (const nlohmann::json::exception& e) {
             throw HostCtlException(std::string("putting back the network configuration: ") + e.what());
         }
-        PutBackFiles(files, iface);
+        auto writeHostFiles = [&] {
+            for (const HostFile& f : hostFiles) ReplaceFile(HostPath(f.path), f.text, f.mode);
+            if (!nodename.empty() && sethostname(nodename.c_str(), nodename.size()) != 0)
+                throw HostCtlException("putting back the host name: " + std::string(std::strerror(errno)));
+        };
+        PutBackFiles(files, iface, writeHostFiles);
+        // A DHCP client writes the resolver file when its lease comes.
+        for (const HostFile& f : hostFiles)
+            if (ReadHostText(f.path) != f.text) ReplaceFile(HostPath(f.path), f.text, f.mode);
     }
 
     void SetVnicConnectionPoint(const std::string&, const Network::ConnectionPoint&) override {

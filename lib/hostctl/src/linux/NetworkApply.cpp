@@ -7,6 +7,8 @@
 
 #include <algorithm>
 #include <chrono>
+#include <cstdlib>
+#include <exception>
 #include <filesystem>
 #include <nlohmann/json.hpp>
 #include <thread>
@@ -236,8 +238,9 @@ bool Shows(const PendingChange& change, std::string& missing) {
         for (const AddressInfo* a : addresses)
             if (a->ipv6 && a->address == want) found = a;
         missing = want;
+        if (found != nullptr && found->DadFailed())
+            throw HostCtlException(want + " is in use by another machine on the link");
         if (found == nullptr || found->Tentative()) return false;
-        if (found->DadFailed()) throw HostCtlException(want + " is in use by another machine on the link");
     }
     return true;
 }
@@ -381,19 +384,112 @@ std::string SavedFiles() {
     return files.dump();
 }
 
-void PutBackFiles(const std::string& saved, const std::string& iface) {
-    nlohmann::json files;
+namespace {
+
+struct SavedFile {
+    std::string path;
+    mode_t mode;
+    std::string text;
+};
+
+// The text with every bridge keeping its VM ports across a reload of
+// ifupdown2.
+std::string CondoningVmPorts(const std::string& text) {
+    InterfacesFile file(text);
+    for (size_t s = 0; s < file.Stanzas().size(); ++s)
+        if (file.Stanzas()[s].keyword == "iface" && file.Option(s, "bridge-ports") &&
+            !file.Option(s, "bridge-ports-condone-regex"))
+            file.SetOption(s, "bridge-ports-condone-regex", VM_PORTS);
+    return file.Print();
+}
+
+// What the saved files give `iface`, as a change whose result to wait for.
+PendingChange SavedChange(const std::vector<SavedFile>& files, const std::string& iface) {
+    Network::IpConfig ip;
+    ip.SetIpv4UseNone();
+    std::vector<Network::Ipv6Network> ipv6;
+    for (const SavedFile& f : files) {
+        const InterfacesFile file(f.text);
+        for (size_t s : file.FindIface(iface)) {
+            const auto& stanza = file.Stanzas()[s];
+            if (stanza.Family() == "inet" && stanza.Method() == "dhcp") ip.SetUseDhcp(true);
+            if (stanza.Method() != "static" && !stanza.Family().empty()) continue;
+            for (const std::string& value : file.OptionValues(s, "address")) {
+                const std::string address = value.substr(0, value.find('/'));
+                const int prefix = value.find('/') == std::string::npos
+                                       ? 64
+                                       : std::atoi(value.c_str() + value.find('/') + 1);
+                if (Network::Ipv4Address::IsValidAddress(address)) {
+                    ip.SetUseDhcp(false);
+                    ip.SetIpv4Address(Network::Ipv4Address(address));
+                } else if (Network::Ipv6Address::IsValidAddress(address)) {
+                    ipv6.emplace_back(Network::Ipv6Address(address), prefix);
+                }
+            }
+        }
+    }
+    ip.SetIpv6Network(ipv6);
+    PendingChange change;
+    change.iface = iface;
+    change.ip = ip;
+    return change;
+}
+
+}  // namespace
+
+void PutBackFiles(const std::string& saved, const std::string& iface,
+                  const std::function<void()>& alongside) {
+    std::vector<SavedFile> files;
     try {
-        files = nlohmann::json::parse(saved);
-        for (const auto& f : files)
-            ReplaceFile(HostPath(f.at("path").get<std::string>()), f.at("text").get<std::string>(),
-                        f.at("mode").get<mode_t>());
+        for (const auto& f : nlohmann::json::parse(saved))
+            files.push_back({f.at("path").get<std::string>(), f.at("mode").get<mode_t>(),
+                             f.at("text").get<std::string>()});
     } catch (const nlohmann::json::exception& e) {
         throw HostCtlException(
             std::string("putting back the network configuration: not a saved configuration: ") + e.what());
     }
-    SetInterfaceUp(iface, false);
-    SetInterfaceUp(iface, true);
+    if (files.empty())
+        throw HostCtlException("putting back the network configuration: no interfaces file saved");
+    const Engine engine = DetectEngine();
+    const std::string what = "putting back the network configuration of " + iface;
+    // A write that fails must not leave the interface down: the engine runs
+    // anyway, and the failure is told afterwards.
+    std::exception_ptr failed;
+    auto write = [&](bool condone) {
+        try {
+            for (const SavedFile& f : files)
+                ReplaceFile(HostPath(f.path), condone ? CondoningVmPorts(f.text) : f.text, f.mode);
+        } catch (...) {
+            failed = std::current_exception();
+        }
+    };
+    auto besides = [&] {
+        try {
+            alongside();
+        } catch (...) {
+            if (!failed) failed = std::current_exception();
+        }
+    };
+    if (engine == Engine::Ifupdown) {
+        // Down with the files in force (they know what is up), without the
+        // hook scripts: the bridge and its VM ports stay.
+        Run({"/sbin/ifdown", "--no-scripts", "--force", iface}, what);
+        write(false);
+        besides();
+        Run({"/sbin/ifup", iface}, what);
+    } else {
+        // ifreload takes VM ports off a bridge its file does not condone
+        // them on: it reads the saved files with them condoned, and the
+        // files then go back byte for byte.
+        write(true);
+        besides();
+        Run({"/sbin/ifreload", "-a"}, what);
+        write(false);
+    }
+    if (failed) std::rethrow_exception(failed);
+    const PendingChange expected = SavedChange(files, iface);
+    WaitFor(expected, expected.ip->GetUseDhcp() ? DHCP_MS : STATIC_MS, what);
+    Syslog(LOG_INFO, "Put back the saved network configuration of %s", iface.c_str());
 }
 
 void SetInterfaceUp(const std::string& iface, bool up) {

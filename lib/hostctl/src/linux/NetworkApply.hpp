@@ -3,6 +3,7 @@
 // the result read back from the kernel.
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <vector>
@@ -63,9 +64,15 @@ void ApplyFactoryLayout(const std::string& oldIface, const std::string& bridge, 
 
 // The interfaces files as they are now, as one text for PutBackFiles.
 std::string SavedFiles();
-// Writes the files of SavedFiles back as they were and has ifupdown apply
-// them to `iface` (bounded).
-void PutBackFiles(const std::string& saved, const std::string& iface);
+// Puts the files of SavedFiles back as they were and applies them to
+// `iface` the way ApplyChange applies a change (VM ports stay on their
+// bridges): ifupdown takes the interface down with the files in force,
+// then the saved ones are written (`alongside` writes its own files at that
+// moment) and the interface brought up; ifupdown2 reloads after the write.
+// Waits (bounded) until the kernel shows the saved files' addresses.
+// Throws HostCtlException for a text that is no saved configuration
+// (nothing is then written) or when the addresses did not come back.
+void PutBackFiles(const std::string& saved, const std::string& iface, const std::function<void()>& alongside);
 
 // Takes the interface down (its addresses and leases go; a bridge and its
 // ports stay) or brings it up again from its stanza, bounded.
