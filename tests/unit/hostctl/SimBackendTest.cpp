@@ -251,6 +251,173 @@ TEST_F(SimBackendTest, DriverVmOwnershipKeepsGroupsTogether) {
 using HostCtl::Lib::Backend;
 
 // A call of the backend operation `name` with the given arguments.
+// The checks after a change of the management network, on the simulated
+// network: each row's state fails (or warns about) the named check.
+TEST_F(SimBackendTest, NetworkChecksFindWhatCutsTheHostOff) {
+    QelCtl::Network::NetworkTrialImpl trial;
+    auto text = [](const std::vector<QelCtl::Network::NetworkCheck>& checks) {
+        static const char* const OUTCOMES[] = {"passed", "FAILED", "warning"};
+        std::vector<std::string> out;
+        for (const auto& c : checks)
+            out.push_back(c.subject + ": " + OUTCOMES[int(c.outcome)] +
+                          (c.detail.empty() ? "" : " " + c.detail));
+        return out;
+    };
+    EXPECT_EQ(text(trial.Check()),
+              (std::vector<std::string>{"link of zonic0: passed", "address 192.0.2.100: passed",
+                                        "gateway 192.0.2.1: passed", "name server 192.0.2.53: passed"}));
+
+    const auto booted = [](std::function<void(json&)> edit) {
+        return [=](json& s) {
+            edit(s);
+            HostCtl::Lib::BootNetwork(HostCtl::Lib::SimState("."), s);
+        };
+    };
+    const auto staticAddress = [](const char* address) {
+        return [=](json& s) {
+            s["network"]["vnics"][0]["ipv4"]["dhcp"] = false;
+            s["network"]["vnics"][0]["ipv4"]["address"] = address;
+        };
+    };
+    struct Case {
+        const char* name;
+        std::function<void(json&)> edit;
+        const char* check;  // the row of text() that tells
+        bool passed;
+    };
+    const Case cases[] = {
+        {"gateway of another VLAN's segment", Set("/network/routing/ipv4Gateway", "198.51.100.1"),
+         "gateway 198.51.100.1: FAILED no answer", false},
+        {"gateway is the host itself", Set("/network/routing/ipv4Gateway", "192.0.2.100"),
+         "gateway 192.0.2.100: FAILED the host's own address", false},
+        {"address of a machine on the segment", staticAddress("192.0.2.53"),
+         "address 192.0.2.53: FAILED duplicate address, used by a machine on VLAN 0", false},
+        {"address of the router, named",
+         [&](json& s) {
+             staticAddress("192.0.2.1")(s);
+             s["network"]["lan"]["0"]["hosts"]["192.0.2.1"]["name"] = "gw-lab";
+         },
+         "address 192.0.2.1: FAILED duplicate address, used by gw-lab", false},
+        {"address leased to another client",
+         [&](json& s) {
+             staticAddress("192.0.2.150")(s);
+             s["network"]["lan"]["0"]["dhcp"]["leases"]["00:50:56:AA:00:01"] = "192.0.2.150";
+         },
+         "address 192.0.2.150: FAILED duplicate address, used by 00:50:56:AA:00:01", false},
+        {"static IPv6 address of a DNS server", booted([](json& s) {
+             Vlan20(s);
+             s["network"]["vnics"][0]["ipv6"]["static"] = {{{"address", "2001:db8:20::53"}, {"prefix", 64}}};
+         }),
+         "address 2001:db8:20::53: FAILED duplicate address, used by a machine on VLAN 20", false},
+        {"VLAN without a DHCP server", booted([](json& s) { SetMgmtVlan(s, 30); }),
+         "IPv4 address (DHCP): FAILED no address", false},
+        {"link down", Set("/network/pnics/0/linkUp", false), "link of zonic0: FAILED no carrier", false},
+        {"standby uplink down beside a working one",
+         [](json& s) {
+             s["network"]["vswitches"][0]["uplinks"] = {"zonic0", "zonic3"};
+             s["network"]["vswitches"][0]["teaming"]["standby"] = {"zonic3"};
+         },
+         "link of zonic3: warning no carrier", true},
+        {"interface disabled", Set("/network/vnics/0/enabled", false), "link of qk0: FAILED interface down",
+         false},
+        {"dead name server", Set("/network/dns/servers", {"192.0.2.53", "192.0.2.54"}),
+         "name server 192.0.2.54: warning no answer", true},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.name);
+        json state = HostCtl::Lib::DefaultHostState();
+        c.edit(state);
+        Reset(state);
+        const auto checks = trial.Check();
+        const std::vector<std::string> rows = text(checks);
+        EXPECT_NE(std::find(rows.begin(), rows.end(), c.check), rows.end()) << testing::PrintToString(rows);
+        EXPECT_EQ(QelCtl::Network::NetworkTrialImpl::Passed(checks), c.passed);
+    }
+
+    // Before the change: who answers for an address is named; a free one,
+    // the host's own lease and an address asked without link pass.
+    Reset();
+    try {
+        trial.ProbeAddress(Ipv4Address("192.0.2.53"));
+        ADD_FAILURE() << "a held address passed the probe";
+    } catch (const HostCtlException& e) {
+        EXPECT_EQ(std::string(e.what()),
+                  "192.0.2.53 is already used on the management network by a machine on VLAN 0");
+    }
+    EXPECT_NO_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.9")));
+    EXPECT_NO_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.100")));
+    Edit(Set("/network/pnics/0/linkUp", false));
+    EXPECT_NO_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.53")));
+}
+
+// Saved, changed, put back: everything the network settings change returns,
+// the hosts file with it; a marker that makes no sense is never applied.
+TEST_F(SimBackendTest, NetworkTrialSavesKeepsAndReverts) {
+    QelCtl::Network::NetworkTrialImpl trial;
+    QelCtl::Network::NetworkInfoImpl network;
+    QelCtl::Network::DnsConfigImpl dns(STACK);
+    const std::string marker = Root() + "/var/lib/velk/network/trial";
+    std::filesystem::create_directories(Root() + "/etc");
+    WriteFile(Root() + "/etc/hosts", "127.0.0.1\tlocalhost\n192.0.2.100\thost1.example.test host1\n");
+    const std::string before = network.GetNetworkConfig(), hostsBefore = ReadFile(Root() + "/etc/hosts");
+    const std::string description = trial.Describe();
+    EXPECT_EQ(description,
+              "management interface qk0, IPv4 DHCP 192.0.2.100/24, IPv6 none, gateways 192.0.2.1, VLAN 0, "
+              "adapters zonic0, name servers 192.0.2.53, host name host1.example.test");
+    auto change = [&] {
+        IpConfig config = Mgmt().GetIpConfig();
+        config.SetUseDhcp(false, false, Ipv4Address("198.51.100.10"), Ipv4Address("255.255.254.0"));
+        Mgmt().SetIpConfig(config);
+        VirtualSwitch("kSwitch0").SetPortGroupVlanId("Management Network", 20);
+        dns.SetFqdn("esx7.lab.test", true);
+        dns.SetSearchDomainsString("lab.test");
+        dns.RemoveNameServers();
+        dns.AddNameServer(IpAddress("198.51.100.53"));
+        QelCtl::Network::RoutingInfoImpl(STACK).SetQelKernelDefaultGateway(Ipv4Address("198.51.100.1"), true);
+    };
+
+    EXPECT_FALSE(trial.IsPending());
+    EXPECT_THROW(trial.Revert(), HostCtlException);
+    trial.Save("root");
+    EXPECT_TRUE(trial.IsPending());
+    EXPECT_EQ(trial.SavedBy(), "root");
+    EXPECT_EQ(trial.SavedDescription(), description);
+    EXPECT_THROW(trial.Save("admin"), HostCtlException);  // the first saved configuration stays
+    change();
+    EXPECT_NE(network.GetNetworkConfig(), before);
+    EXPECT_NE(trial.Describe(), description);
+    trial.Revert();
+    EXPECT_EQ(network.GetNetworkConfig(), before);
+    EXPECT_EQ(ReadFile(Root() + "/etc/hosts"), hostsBefore);
+    EXPECT_FALSE(trial.IsPending());
+    EXPECT_FALSE(std::filesystem::exists(marker));
+
+    trial.Save("root");
+    change();
+    const std::string changed = network.GetNetworkConfig();
+    trial.Keep();
+    EXPECT_FALSE(trial.IsPending());
+    EXPECT_EQ(trial.SavedBy(), "");
+    EXPECT_EQ(network.GetNetworkConfig(), changed);
+
+    // Garbage is logged and moved aside, and nothing is put back.
+    WriteFile(marker, "{\"config\": \"{\\\"/network/vnics\\\"");
+    EXPECT_FALSE(trial.IsPending());
+    EXPECT_TRUE(std::filesystem::exists(marker + ".unreadable"));
+    EXPECT_NE(ReadFile(Root() + "/var/log/syslog.log").find(marker + " is not a saved network configuration"),
+              std::string::npos);
+    EXPECT_THROW(trial.Revert(), HostCtlException);
+    // A configuration the host never gave out is refused; the marker stays.
+    WriteFile(marker, json({{"config", "{\"/network/vnics\": 5}"},
+                            {"description", "?"},
+                            {"user", "root"},
+                            {"time", "2026-11-24T08:00:00.000Z"}})
+                          .dump());
+    ExpectRefused([&] { trial.Revert(); });
+    EXPECT_TRUE(trial.IsPending());
+    EXPECT_EQ(network.GetNetworkConfig(), changed);
+}
+
 #define CALL(name, ...) [&](Backend& b) { b.name(__VA_ARGS__); }
 #define OP(name, ...) \
     { #name, CALL(name, __VA_ARGS__) }
@@ -288,6 +455,8 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
         OP(SetVnicMacAddress, "qk0", "00:50:56:01:00:0a"),
         OP(RenewVnicDhcpLease, "qk0"),
         OP(SetVnicEnabled, "qk0", false),
+        OP(ProbeIpv4Address, "qk0", Ipv4Address("192.0.2.9")),
+        OP(CheckNetwork, "qk0"),
         OP(GetIpv6Enabled),
         OP(SetIpv6Enabled, false),
         OP(GetConnectionPointSwitch, mgmtGroup),

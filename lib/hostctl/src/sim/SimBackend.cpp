@@ -57,6 +57,8 @@ const std::vector<std::string> OPERATIONS = {
     "SetVnicMacAddress",
     "RenewVnicDhcpLease",
     "SetVnicEnabled",
+    "ProbeIpv4Address",
+    "CheckNetwork",
     "GetIpv6Enabled",
     "SetIpv6Enabled",
     "GetConnectionPointSwitch",
@@ -328,6 +330,26 @@ public:
                 {vnic, enabled});
     }
 
+    // The machines of the interface's VLAN segment answer for the addresses
+    // they hold (SimNetwork.cpp).
+    std::optional<std::string> ProbeIpv4Address(const std::string& vnic,
+                                                const Network::Ipv4Address& address) override {
+        return Reading("ProbeIpv4Address", [&](const json& s) -> std::optional<std::string> {
+            const NetworkView network(_sim, s);
+            std::string holder =
+                network.Holder(network.VnicPointer(vnic), Network::IpAddress(address.GetStringAddress()));
+            if (holder.empty()) return std::nullopt;
+            return holder;
+        });
+    }
+
+    std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string& vnic) override {
+        return Reading("CheckNetwork", [&](const json& s) {
+            const NetworkView network(_sim, s);
+            return network.Checks(network.VnicPointer(vnic));
+        });
+    }
+
     bool GetIpv6Enabled() override {
         return Reading("GetIpv6Enabled", [&](const json& s) { return _sim.Bool(s, "/network/ipv6Enabled"); });
     }
@@ -508,7 +530,8 @@ public:
         Writing("AutoConfigNetwork", [&](json& s) { NetworkModel(_sim, s).AutoConfig(); });
     }
 
-    // The fields ClearNetworkConfig changes, by JSON pointer.
+    // The fields ClearNetworkConfig changes and those the network settings
+    // change besides (host name, domain, search domains), by JSON pointer.
     static const std::vector<std::string>& NetworkConfigFields() {
         static const std::vector<std::string> fields = {"/network/vnics",
                                                         "/network/vswitches",
@@ -519,16 +542,14 @@ public:
                                                         "/network/dns/servers",
                                                         "/network/dns/ipv6Servers",
                                                         "/network/saved/dns/servers",
-                                                        "/network/saved/dns/ipv6Servers"};
+                                                        "/network/saved/dns/ipv6Servers",
+                                                        "/network/dns/hostname",
+                                                        "/network/dns/domain",
+                                                        "/network/dns/searchDomains",
+                                                        "/network/saved/dns/hostname",
+                                                        "/network/saved/dns/domain",
+                                                        "/network/saved/dns/searchDomains"};
         return fields;
-    }
-
-    // Placeholders until the checks are built.
-    std::optional<std::string> ProbeIpv4Address(const std::string&, const Network::Ipv4Address&) override {
-        throw HostCtlException("not built yet");
-    }
-    std::vector<QelCtl::Network::NetworkCheck> CheckNetwork(const std::string&) override {
-        throw HostCtlException("not built yet");
     }
 
     std::string GetNetworkConfig() override {
@@ -547,7 +568,13 @@ public:
             for (const auto& [field, value] : config.items()) {
                 if (std::ranges::find(NetworkConfigFields(), field) == NetworkConfigFields().end())
                     throw HostCtlException("not a network configuration of this host: " + field);
-                s[json::json_pointer(field)] = value;
+                // A value of another kind than the host's own is no
+                // configuration it ever gave out.
+                const json::json_pointer at(field);
+                if (s.contains(at) && s.at(at).type() != value.type())
+                    throw HostCtlException("not a network configuration of this host: " + field + " holds " +
+                                           value.type_name());
+                s[at] = value;
             }
         });
     }

@@ -250,7 +250,14 @@ bool NetworkView::PnicHasLink(const std::string& pnic) const {
 }
 
 bool NetworkView::HasLink(const std::string& v) const {
-    if (!_sim.Bool(_view, v + "/enabled")) return false;
+    if (!_sim.Bool(_view, v + "/enabled") || PortBlocked(v)) return false;
+    for (const std::string& uplink : Uplinks(v))
+        if (PnicHasLink(uplink)) return true;
+    return false;
+}
+
+std::vector<std::string> NetworkView::Uplinks(const std::string& v) const {
+    std::vector<std::string> uplinks;
     switch (_sim.Integer(_view, v + "/connectionType")) {
         case Network::ConnectionPoint::PortGroup: {
             const std::string portGroup = _sim.String(_view, v + "/portgroup");
@@ -260,21 +267,18 @@ bool NetworkView::HasLink(const std::string& v) const {
                 if (Find(sw + "/portgroups", portGroup).empty()) continue;
                 for (const char* role : {"/teaming/active", "/teaming/standby"})
                     for (const std::string& uplink : _sim.StringList(_view, sw + role))
-                        if (PnicHasLink(uplink)) return true;
-                return false;
+                        uplinks.push_back(uplink);
+                break;
             }
-            return false;
+            break;
         }
         case Network::ConnectionPoint::DvsPort: {
             const std::string dvs = Find("/network/dvswitches", _sim.String(_view, v + "/dvs"));
-            if (dvs.empty()) return false;
+            if (dvs.empty()) break;
             const std::string port = Find(dvs + "/ports", _sim.String(_view, v + "/port"), "key");
-            if (port.empty()) return false;
-            // A blocked port passes nothing; a port limited to some uplinks
-            // reaches the network only through those.
-            const json& portObject = _view.at(json::json_pointer(port));
-            if (portObject.contains("blocked") && _sim.Bool(_view, port + "/blocked")) return false;
-            const bool limited = portObject.contains("uplinks");
+            if (port.empty()) break;
+            // A port limited to some uplinks reaches the network only through those.
+            const bool limited = _view.at(json::json_pointer(port)).contains("uplinks");
             const std::vector<std::string> allowed =
                 limited ? _sim.StringList(_view, port + "/uplinks") : std::vector<std::string>{};
             const std::string ports = dvs + "/uplinkPorts";
@@ -282,13 +286,23 @@ bool NetworkView::HasLink(const std::string& v) const {
                 const std::string key = _sim.String(_view, At(ports, i) + "/key");
                 if (limited && std::find(allowed.begin(), allowed.end(), key) == allowed.end()) continue;
                 const std::string pnic = _sim.String(_view, At(ports, i) + "/pnic");
-                if (!pnic.empty() && PnicHasLink(pnic)) return true;
+                if (!pnic.empty()) uplinks.push_back(pnic);
             }
-            return false;
+            break;
         }
         default:
-            return false;
+            break;
     }
+    return uplinks;
+}
+
+bool NetworkView::PortBlocked(const std::string& v) const {
+    if (_sim.Integer(_view, v + "/connectionType") != Network::ConnectionPoint::DvsPort) return false;
+    const std::string dvs = Find("/network/dvswitches", _sim.String(_view, v + "/dvs"));
+    if (dvs.empty()) return false;
+    const std::string port = Find(dvs + "/ports", _sim.String(_view, v + "/port"), "key");
+    if (port.empty()) return false;
+    return _view.at(json::json_pointer(port)).contains("blocked") && _sim.Bool(_view, port + "/blocked");
 }
 
 int NetworkView::Vlan(const std::string& v) const {
@@ -382,6 +396,159 @@ const json* NetworkView::Reach(const std::string& v, const IpAddress& target) co
     if (router.IsIpv6() != target.IsIpv6() || (router.IsIpv6() ? router.V6().IsZero() : router.V4().IsZero()))
         return nullptr;
     return OnSegment(v, router) != nullptr ? remote : nullptr;
+}
+
+std::string NetworkView::Holder(const std::string& v, const IpAddress& address) const {
+    const int vlan = Vlan(v);
+    if (vlan < 0 || !HasLink(v)) return "";
+    const std::string segment = "/network/lan/" + std::to_string(vlan);
+    const std::string where = "VLAN " + std::to_string(vlan);
+    if (const json* machine = Machine(segment + "/hosts", address)) {
+        const auto name = machine->find("name");
+        if (name == machine->end()) return "a machine on " + where;
+        if (!name->is_string())
+            throw _sim.Error("the \"name\" field of machine " + address.GetStringAddress() + " must be text");
+        return name->get<std::string>();
+    }
+    // The servers of the segment: a router holds its own address, and a DHCP
+    // server's leases are held by the other clients.
+    const std::string ownMac = Lower(_sim.String(_view, v + "/mac"));
+    for (const char* kind : {"dhcp", "routerAdvertisement", "dhcpv6"}) {
+        const json::json_pointer at(segment + "/" + kind);
+        if (!_view.contains(at) || _view.at(at).is_null()) continue;
+        const std::string server = segment + "/" + kind;
+        const json& object = _sim.Object(_view, server);
+        for (const char* router : {"gateway", "router"}) {
+            if (!object.contains(router)) continue;
+            const std::string text = _sim.String(_view, server + "/" + router);
+            if (IsIpText(text) && IpAddress(text) == address) return "the router of " + where;
+        }
+        if (!object.contains("leases") || object["leases"].is_null()) continue;
+        const json& leases = _sim.Object(_view, server + "/leases");
+        for (auto it = leases.begin(); it != leases.end(); ++it) {
+            const std::string held = it->is_string() ? it->get<std::string>() : "";
+            if (Lower(it.key()) != ownMac && IsIpText(held) && IpAddress(held) == address) return it.key();
+        }
+    }
+    return "";
+}
+
+std::vector<QelCtl::Network::NetworkCheck> NetworkView::Checks(const std::string& v) const {
+    using Check = QelCtl::Network::NetworkCheck;
+    using Outcome = Check::Outcome;
+    std::vector<Check> checks;
+    auto add = [&](std::string subject, Outcome outcome, std::string detail = "") {
+        checks.push_back({std::move(subject), outcome, std::move(detail)});
+    };
+    const std::string name = _sim.String(_view, v + "/name");
+
+    // Link: one physical uplink with carrier is enough; the others that have
+    // none are only warned about.
+    const std::vector<std::string> uplinks = Uplinks(v);
+    if (!_sim.Bool(_view, v + "/enabled")) {
+        add("link of " + name, Outcome::Failed, "interface down");
+    } else if (PortBlocked(v)) {
+        add("link of " + name, Outcome::Failed, "port blocked");
+    } else if (uplinks.empty()) {
+        add("link of " + name, Outcome::Failed, "no uplink");
+    } else {
+        const bool any = HasLink(v);
+        for (const std::string& uplink : uplinks) {
+            if (PnicHasLink(uplink))
+                add("link of " + uplink, Outcome::Passed);
+            else
+                add("link of " + uplink, any ? Outcome::Warning : Outcome::Failed, "no carrier");
+        }
+    }
+
+    // Addresses: present, and held by no other machine of the segment.
+    auto address = [&](const std::string& subject, const IpAddress& held) {
+        const std::string holder = Holder(v, held);
+        if (holder.empty())
+            add(subject, Outcome::Passed);
+        else
+            add(subject, Outcome::Failed, "duplicate address, used by " + holder);
+    };
+    if (!_sim.Bool(_view, v + "/ipv4/none")) {
+        const std::string text = _sim.String(_view, v + "/ipv4/address");
+        if (!Ipv4Address::IsValidAddress(text))
+            throw _sim.Error("field " + v + "/ipv4/address is not an IPv4 address: \"" + text + "\"");
+        const bool dhcp = _sim.Bool(_view, v + "/ipv4/dhcp");
+        if (Ipv4Address(text).IsZero())
+            add(dhcp ? "IPv4 address (DHCP)" : "IPv4 address", Outcome::Failed, "no address");
+        else
+            address("address " + text, IpAddress(text));
+    }
+    if (_sim.Bool(_view, "/network/ipv6Enabled")) {
+        const json& held = _sim.Array(_view, v + "/ipv6/addresses");
+        auto holds = [&](const Ipv6Address& wanted, const char* type) {
+            for (const json& a : held) {
+                const std::string text = a.is_object() ? TextAt(a, "/address") : "";
+                if (Ipv6Address::IsValidAddress(text) && Ipv6Address(text) == wanted &&
+                    (type == nullptr || TextAt(a, "/type") == type))
+                    return true;
+            }
+            return false;
+        };
+        const std::string statics = v + "/ipv6/static";
+        for (size_t i = 0; i < _sim.Array(_view, statics).size(); ++i) {
+            const std::string text = _sim.String(_view, At(statics, i) + "/address");
+            if (!Ipv6Address::IsValidAddress(text))
+                throw _sim.Error("field " + At(statics, i) + "/address is not an IPv6 address: \"" + text +
+                                 "\"");
+            const Ipv6Address wanted(text);
+            const std::string subject = "address " + wanted.GetStringAddress();
+            if (!holds(wanted, nullptr))
+                add(subject, Outcome::Failed, "no address");
+            else
+                address(subject, IpAddress(wanted.GetStringAddress()));
+        }
+        // Obtained addresses are the network's to give; a DHCPv6 server that
+        // does not answer is worth a warning.
+        bool leased = false;
+        for (const json& a : held) {
+            const std::string text = a.is_object() ? TextAt(a, "/address") : "";
+            const std::string type = a.is_object() ? TextAt(a, "/type") : "";
+            if (type == "static" || !Ipv6Address::IsValidAddress(text) || Ipv6Address(text).IsLinkLocal())
+                continue;
+            leased = leased || type == "dhcp";
+            add("address " + Ipv6Address(text).GetStringAddress(), Outcome::Passed);
+        }
+        if (_sim.Bool(_view, v + "/ipv6/dhcp") && !leased)
+            add("IPv6 address (DHCPv6)", Outcome::Warning, "no address");
+    }
+
+    // Default gateways answer on the link.
+    for (const char* family : {"ipv4Gateway", "ipv6Gateway"}) {
+        const std::string field = std::string("/network/routing/") + family;
+        const std::string text = _sim.String(_view, field);
+        if (!IsIpText(text)) throw _sim.Error("field " + field + " is not an IP address: \"" + text + "\"");
+        const IpAddress gateway(text);
+        if (gateway.IsIpv6() ? gateway.V6().IsZero() : gateway.V4().IsZero()) continue;
+        const std::string subject = (gateway.IsIpv6() ? "IPv6 gateway " : "gateway ") + text;
+        if (IsOwnAddress(v, gateway))
+            add(subject, Outcome::Failed, "the host's own address");
+        else if (OnSegment(v, gateway) == nullptr || !HasLink(v))
+            add(subject, Outcome::Failed, "no answer");
+        else
+            add(subject, Outcome::Passed);
+    }
+
+    // Name servers: a DNS server that answers from the interface answers
+    // the query for the host's own name.
+    std::vector<std::string> servers = _sim.StringList(_view, "/network/dns/servers");
+    for (const std::string& server : _sim.StringList(_view, "/network/dns/ipv6Servers"))
+        servers.push_back(server);
+    for (const std::string& server : servers) {
+        if (!IsIpText(server)) throw _sim.Error("the name server \"" + server + "\" is not an IP address");
+        const json* machine = Reach(v, IpAddress(server));
+        const bool answers = machine != nullptr && machine->value("dns", json(false)) == json(true);
+        if (answers)
+            add("name server " + server, Outcome::Passed);
+        else
+            add("name server " + server, Outcome::Warning, "no answer");
+    }
+    return checks;
 }
 
 std::vector<IpAddress> NetworkView::Resolve(const std::string& name) const {

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "hostctl/HostCtl.hpp"
+#include "hostctl/QelCtl.hpp"
 #include "hostctl/SimState.hpp"
 
 namespace HostCtl::Lib {
@@ -37,6 +38,20 @@ public:
     // Whether the virtual NIC is enabled and its switch has a teaming uplink
     // (or a distributed uplink port) whose NIC has link.
     bool HasLink(const std::string& vnicPointer) const;
+    // The physical NICs the virtual NIC's traffic may leave by: the teaming
+    // policy's active then standby uplinks of its port group's switch, or the
+    // NICs behind the uplink ports its distributed port may use.
+    std::vector<std::string> Uplinks(const std::string& vnicPointer) const;
+    // Who else on the virtual NIC's VLAN segment holds `address`: a machine
+    // of the segment (its "name", or a description without one), the
+    // segment's router, or another client's DHCP lease (its MAC address);
+    // "" when nobody does or the interface has no link to ask on.
+    std::string Holder(const std::string& vnicPointer, const Network::IpAddress& address) const;
+    // The checks of the virtual NIC after a change of its network, in order:
+    // link of its uplinks, its addresses (present, not held by another
+    // machine), the default gateways, the name servers (a warning when one
+    // does not answer).
+    std::vector<QelCtl::Network::NetworkCheck> Checks(const std::string& vnicPointer) const;
     // The VLAN of the virtual NIC's port group or distributed port, or -1
     // when it is connected to neither.
     int Vlan(const std::string& vnicPointer) const;
@@ -63,6 +78,8 @@ protected:
     // or "" when none is.
     std::string Find(const std::string& list, const std::string& name, const char* key = "name") const;
     bool PnicHasLink(const std::string& pnic) const;
+    // Whether the virtual NIC is on a distributed port that passes nothing.
+    bool PortBlocked(const std::string& vnicPointer) const;
     // The entry of `target` in the object of machines at `pointer` (keyed by
     // address), or null.
     const nlohmann::json* Machine(const std::string& pointer, const Network::IpAddress& target) const;

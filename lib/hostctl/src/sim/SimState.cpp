@@ -99,7 +99,11 @@ bool WriteAll(int fd, const std::string& data) {
 //   IPv6 router "routerAdvertisement" ("prefix", "prefixLength", the "router"
 //   address) and a DHCPv6 server "dhcpv6" ("first", "last", "dns", "leases").
 //   "hosts" are the machines on the VLAN's segment, by address: {"dns": true
-//   for a DNS server, "delayMs": how long its answer to a ping takes}.
+//   for a DNS server, "delayMs": how long its answer to a ping takes,
+//   "name": how it answers a probe for its address (optional)}. The
+//   segment's machines, its DHCP "gateway", its IPv6 "router" and the other
+//   clients' leases hold their addresses: the host's checks find them as
+//   duplicates.
 // - "remote": the machines beyond the routers, in the same shape; reached
 //   through the default gateway. "dnsZone": what the network's DNS servers
 //   answer, {"name": ["address", ...]}. "pingTimeoutMs": how long qelping
