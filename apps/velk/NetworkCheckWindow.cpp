@@ -40,14 +40,20 @@ int NetworkCheckWindow::Height(size_t checks) {
 void NetworkCheckWindow::DrawChecks() {
     SetTitle(_factory->GetString(285));
     SetDescription(_factory->GetString(_stage == CHANGED ? 286 : 295));
+    // The results in a column as wide as the widest of them.
+    int resultWidth = 0;
+    for (int id : {287, 288, 289})
+        resultWidth = std::max(resultWidth, TextArea::Columns(_factory->GetString(id)));
     std::string text;
     for (const NetworkCheck& check : _checks) {
         const bool failed = check.outcome == NetworkCheck::Outcome::Failed;
         const int result = failed ? 288 : check.outcome == NetworkCheck::Outcome::Warning ? 289 : 287;
+        const std::string label = _factory->GetString(result);
         std::string row = TextArea::Escape(check.subject);
         if (!check.detail.empty()) row += ": " + TextArea::Escape(check.detail);
-        text += std::string(failed ? "{color:red}" : "{color:black}") + _factory->GetString(result) +
-                "{/color}  {color:dark-grey}" + row + "{/color}\n";
+        text += std::string(failed ? "{color:red}" : "{color:black}") + TextArea::Escape(label) + "{/color}" +
+                std::string(static_cast<size_t>(resultWidth - TextArea::Columns(label) + 2), ' ') +
+                "{color:dark-grey}" + row + "{/color}\n";
     }
     _list->SetText(text);
     if (_stage == CHANGED) {

@@ -185,7 +185,7 @@ TEST_P(TrialEndTest, ThePreviousConfigurationComesBack) {
     ASSERT_TRUE(t->WaitForExit());
     host.Clear("SetSearchDomains");
     const bool killed = c.signal == SIGKILL;
-    EXPECT_EQ(host.ConsoleLog("Network change by root reverted;", t->Pid()).size(), killed ? 0u : 1u)
+    EXPECT_EQ(host.ConsoleLog(": Network change by root reverted;", t->Pid()).size(), killed ? 0u : 1u)
         << Joined(host.SyslogLines());
 
     ASSERT_TRUE(Start());
