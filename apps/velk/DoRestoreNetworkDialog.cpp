@@ -3,6 +3,8 @@
 #include <syslog.h>
 
 #include "CommandRunner.hpp"
+#include "NetworkTrial.hpp"
+#include "RootWindow.hpp"
 #include "RunningVMsWarningDialog.hpp"
 #include "StringFactory.hpp"
 #include "hostctl/Host.hpp"
@@ -56,11 +58,18 @@ int DoRestoreNetworkDialog::Run() {
     // be made: a failed restore leaves the host as it was, not without network.
     std::string removed;
     bool cleared = false;
+    bool restored = false;
+    // The configuration as it is goes aside first, as for every change of
+    // the management network: restored settings that fail their checks, or
+    // a console that ends before they are decided, get it back.
+    NetworkTrial trial(this);
     try {
         networkInfo.DisableNetDumper();
         if (powerOffFailed) {
             Log(failed);
             Syslog(LOG_ERR, "Error powering off VMs");
+        } else if (!trial.Begin()) {
+            Log(failed);
         } else {
             Log(std::string(_factory->GetString(210)) + " ");
             removed = networkInfo.GetNetworkConfig();
@@ -70,6 +79,7 @@ int DoRestoreNetworkDialog::Run() {
             Syslog(LOG_INFO, "Auto-Configuring Network");
             networkInfo.AutoConfigNetwork();
             Log(done);
+            restored = true;
         }
     } catch (const HostCtl::Lib::HostCtlException&) {
         Log(failed);
@@ -82,6 +92,13 @@ int DoRestoreNetworkDialog::Run() {
                 Syslog(LOG_ERR, "Putting back the network configuration failed: %s", e.what());
             }
         }
+    }
+
+    if (restored) {
+        Log(std::string(_factory->GetString(303)) + " ");
+        const std::vector<QelCtl::Network::NetworkCheck> checks = trial.Check();
+        Log(QelCtl::Network::NetworkTrialImpl::Passed(checks) ? done : failed);
+        RootWindow::PostStatus(trial.Decide(checks));
     }
 
     SetFooter("{align:right}{color:black}<Enter>{/color}{color:dark-grey} OK{/color}{/align}");

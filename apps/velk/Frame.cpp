@@ -14,6 +14,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <memory>
+#include <utility>
 #include <vector>
 
 #include "Console.hpp"
@@ -35,6 +36,7 @@ bool Frame::_loggedIn = false;
 bool Frame::_markForRestart = false;
 unsigned int Frame::_idleTimeout = 600;
 std::function<void(pid_t, int)> Frame::_childExitHandler;
+std::function<void()> Frame::_atEnd;
 
 namespace {
 constexpr long kDimSeconds = 60;
@@ -44,11 +46,14 @@ constexpr int kEmptyReadsAtEnd = 3;
 // How long the main thread has to end after a termination signal before the
 // signal side ends the process itself (it is stuck somewhere).
 constexpr unsigned kEmergencyExitSeconds = 5;
+// How much longer it waits while the work before the end runs.
+constexpr unsigned kAtEndSeconds = 30;
 
 std::atomic<int> endRequest{0};  // 0 or the event that ends the console
 std::atomic<pid_t> foregroundChild{0};
 std::atomic<bool> loggedInShadow{false};  // _loggedIn, readable by the signal thread
 std::atomic<bool> emergencyArmed{false};
+std::atomic<bool> atEndRunning{false};
 int emptyReads = 0;
 
 // Last resort when the main thread does not end after a termination signal:
@@ -57,6 +62,7 @@ int emptyReads = 0;
 void* EmergencyExit(void*) {
     unsigned left = kEmergencyExitSeconds;
     while (left > 0) left = sleep(left);
+    for (unsigned waited = 0; atEndRunning.load() && waited < kAtEndSeconds; ++waited) sleep(1);
     const pid_t child = foregroundChild.load();
     if (child > 0) kill(child, SIGKILL);
     tcsetattr(1, TCSANOW, &orig_termios);
@@ -125,13 +131,16 @@ int Frame::Execute() {
     return result;
 }
 
-int Frame::GetKey(bool useIdleTimeout) {
+int Frame::GetKey(bool useIdleTimeout, long tickMillis) {
     struct timeval start;
     gettimeofday(&start, nullptr);
     const bool limited = useIdleTimeout && _idleTimeout != 0;
     const long limitSeconds = std::max<long>(_idleTimeout, kDimSeconds);
     const struct timeval dimAt = {start.tv_sec + kDimSeconds, start.tv_usec};
     const struct timeval timeoutAt = {start.tv_sec + limitSeconds, start.tv_usec};
+    const struct timeval tick = {tickMillis / 1000, (tickMillis % 1000) * 1000};
+    struct timeval tickAt;
+    timeradd(&start, &tick, &tickAt);
     bool dimmed = false;
 
     for (;;) {
@@ -141,21 +150,29 @@ int Frame::GetKey(bool useIdleTimeout) {
             fgFrame = nullptr;
             throw VelkTimeout();
         }
+        if (tickMillis > 0 && !timercmp(&now, &tickAt, <)) return EV_TIMEOUT;
         int result;
         if (!dimmed && timercmp(&now, &dimAt, >)) {
             Show(false);
             Refresh();
             dimmed = true;
         }
+        // The nearest of the dimming, the idle timeout and the tick.
+        struct timeval left;
+        struct timeval* wait = &left;
         if (!dimmed) {
-            struct timeval left = Remaining(now, dimAt);
-            result = WaitForInput(&left);
+            left = Remaining(now, dimAt);
         } else if (limited) {
-            struct timeval left = Remaining(now, timeoutAt);
-            result = WaitForInput(&left);
+            left = Remaining(now, timeoutAt);
         } else {
-            result = WaitForInput(nullptr);
+            wait = nullptr;
         }
+        if (tickMillis > 0) {
+            const struct timeval untilTick = Remaining(now, tickAt);
+            if (!wait || timercmp(&untilTick, &left, <)) left = untilTick;
+            wait = &left;
+        }
+        result = WaitForInput(wait);
 
         switch (result) {
             case EV_TIMEOUT:
@@ -357,9 +374,20 @@ void Frame::EndIfRequested() {
     if (event != 0) End(event);
 }
 
+void Frame::RunAtEnd() {
+    // Taken first: work that ends the console again from inside does not
+    // run it twice.
+    const std::function<void()> work = std::exchange(_atEnd, nullptr);
+    if (!work) return;
+    atEndRunning.store(true);
+    work();
+    atEndRunning.store(false);
+}
+
 void Frame::End(int event) {
     if (event == EV_RESIZE) ResizeTerminal();
     if (event == EV_HANGUP) Syslog(LOG_WARNING, "Terminal hung up, exiting");
+    RunAtEnd();
     exit(0);
 }
 
@@ -499,6 +527,7 @@ void Frame::CheckSmartCard() {
             Syslog(LOG_INFO, "Found smart card with user id '%s'", _smartCardLoginId.c_str());
     } else if (_isLoggedWithSmartCard && !IsSmartCardPresent(_loginName)) {
         Syslog(LOG_INFO, "Logging out user id '%s'", _loginName.c_str());
+        RunAtEnd();
         exit(0);
     }
 }

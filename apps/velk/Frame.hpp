@@ -30,7 +30,10 @@ public:
     virtual void Update() {}
 
     int Execute();
-    int GetKey(bool useIdleTimeout);
+    // The next key. With `tickMillis` > 0 it gives up after that long without
+    // a key and returns EV_TIMEOUT (a screen that counts down); otherwise the
+    // console waits without waking up.
+    int GetKey(bool useIdleTimeout, long tickMillis = 0);
 
     static int WaitForInput(struct timeval* timeout);
     static void StartSignalHandling();
@@ -52,6 +55,12 @@ public:
     // is set, GetKey also returns EV_CHILD after a child ended, so that a
     // screen waiting for a child can look again.
     static std::function<void(pid_t, int)> _childExitHandler;
+
+    // Run once before the console ends on a signal, a hang-up, the end of its
+    // input or a removed smart card, while set (a network change on trial is
+    // put back). The last resort after a termination signal waits for it, up
+    // to half a minute.
+    static std::function<void()> _atEnd;
 
     // A termination signal (or a resize) while the console waits for a child
     // must still end it promptly. The child the console waits for in the
@@ -93,6 +102,7 @@ public:
     static unsigned int _idleTimeout;
 
 private:
+    static void RunAtEnd();
     static void RequestEnd(int event);
     // Ends the console (status 0) for an ending event: a resize is adopted
     // and logged, a hang-up logged.

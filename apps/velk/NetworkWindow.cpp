@@ -16,6 +16,7 @@
 #include "IPv6ConfigurationDialog.hpp"
 #include "ManagementInterface.hpp"
 #include "MessageDialog.hpp"
+#include "NetworkTrial.hpp"
 #include "RebootConfirmDialog.hpp"
 #include "StringFactory.hpp"
 #include "SuffixesDialog.hpp"
@@ -363,7 +364,11 @@ bool NetworkWindow::Leave() {
     ApplyChangesDialog question(this, reboot);
     if (!question.Execute()) return false;  // Esc: back to the menu, every edit kept
     if (!question.apply) return true;
-    Apply();
+    // Refused before anything was written: back to the menu, every edit kept.
+    if (!Apply()) {
+        _statusLine->Erase();
+        return false;
+    }
     Syslog(LOG_INFO, "Network settings changed.");
     _statusLine->Erase();
     _statusLine->Refresh();
@@ -402,7 +407,25 @@ std::string NetworkWindow::ScopedIpv6Gateway() const {
     return _ipv6Gateway.IsLinkLocal() ? text + "%" + _mgmtIntf->GetName() : text;
 }
 
-void NetworkWindow::Apply() {
+// A new static IPv4 address is one the interface did not have as a static
+// address when the window was entered.
+bool NetworkWindow::NewStaticIpv4Address() const {
+    if (_ipConfig.GetUseDhcp() || _ipConfig.GetIpv4UseNone()) return false;
+    const bool staticAtStart = !_ipConfigAtStart.GetUseDhcp() && !_ipConfigAtStart.GetIpv4UseNone();
+    return !staticAtStart || !(_ipConfig.GetIpv4Address() == _ipConfigAtStart.GetIpv4Address());
+}
+
+bool NetworkWindow::Apply() {
+    if (NewStaticIpv4Address()) {
+        Step("Probing for %s on %s", _ipConfig.GetIpv4Address().GetStringAddress().c_str(),
+             _mgmtIntf->GetName().c_str());
+        if (!NetworkTrial::AddressFree(this, _ipConfig.GetIpv4Address())) return false;
+    }
+    // The configuration as it is goes aside first: a change that fails its
+    // checks, or a console that ends before it is decided, gets it back.
+    NetworkTrial trial(this);
+    if (!trial.Begin()) return false;
+
     // The steps reach the host as one change: a host may apply them together.
     QelCtl::Network::NetworkInfoImpl networkInfo;
     try {
@@ -421,11 +444,14 @@ void NetworkWindow::Apply() {
     } catch (const HostCtlException& e) {
         Fail(std::string("Applying network configuration failed: ") + e.what());
     }
+    Step("Checking the management network");
+    PostStatus(trial.Decide(trial.Check()));
     if (ipv6Enabled != ipv6EnabledAtStart) {
         RebootConfirmDialog reboot(this, true);
         reboot.Execute();
     }
     RefreshHostAgent();
+    return true;
 }
 
 void NetworkWindow::ApplyAdapters() {

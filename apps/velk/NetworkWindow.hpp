@@ -3,7 +3,10 @@
 // and, when the window is left, asks whether to apply the changes. Applying
 // is one ordered sequence of host calls; a step that fails is logged and
 // shown, and the sequence goes on with the next step. Nothing is written to
-// the host before the administrator says yes.
+// the host before the administrator says yes. The sequence runs on trial
+// (NetworkTrial): the configuration is saved before it and checked after it,
+// and a change that fails its checks is put back unless the administrator
+// keeps it.
 #pragma once
 
 #include <memory>
@@ -70,8 +73,11 @@ private:
     // Asks whether to apply; true when the window is to close.
     bool Leave();
 
-    // Actions: the apply sequence.
-    void Apply();
+    // Actions: the apply sequence, on trial. False when it was refused
+    // before anything was written (an address in use, a configuration that
+    // could not be saved).
+    bool Apply();
+    bool NewStaticIpv4Address() const;
     void ApplyAdapters();
     bool ApplyVlan();
     void ApplyIpConfiguration();

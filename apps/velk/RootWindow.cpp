@@ -2,13 +2,17 @@
 
 #include <syslog.h>
 
+#include <algorithm>
 #include <cstring>
 
 #include "Console.hpp"
+#include "DisplayWidth.hpp"
 #include "StringFactory.hpp"
 #include "hostctl/Host.hpp"
 
 namespace Velk {
+
+std::string RootWindow::_postedStatus;
 
 RootWindow::RootWindow(Frame* parent)
     : Frame(parent, 0, 0, COLS, LINES, BLACK, WHITE),
@@ -45,8 +49,19 @@ void RootWindow::Draw() {
     const int length = static_cast<int>(std::strlen(heading));
     _main->Print(_main->GetWidth() / 2 - length / 2, 0, heading);
     DrawContents();
+    if (!_postedStatus.empty()) {
+        _statusLine->Erase();
+        _statusLine->Print(1, 0, CutToColumns(_postedStatus, std::max(0, COLS - 2)));
+        _postedStatus.clear();
+        _showsPostedStatus = true;
+    } else if (_showsPostedStatus) {
+        _statusLine->Erase();
+        _showsPostedStatus = false;
+    }
     Refresh();
 }
+
+void RootWindow::PostStatus(const std::string& line) { _postedStatus = line; }
 
 int RootWindow::RunMenu(const std::function<void()>& describe, const std::function<void(int)>& open,
                         const std::function<bool()>& leave) {

@@ -26,6 +26,11 @@ public:
     // Shows the window, the heading and the subclass's contents.
     void Draw();
 
+    // A line for the status row of the next menu window drawn (what became
+    // of a change once its window closed); that window's next drawing
+    // clears it again.
+    static void PostStatus(const std::string& line);
+
     // The key loop of a sub-menu: Up and Down move the selection and call
     // `describe`, Enter calls `open` with the selected entry's index, Esc
     // ends the loop with true once `leave` agrees. Other keys are ignored.
@@ -49,6 +54,10 @@ protected:
     TextArea* _rightFooter;
     ItemList* _menu;
     TextArea* _description;
+
+private:
+    static std::string _postedStatus;
+    bool _showsPostedStatus = false;
 };
 
 }  // namespace Velk

@@ -22,6 +22,7 @@ namespace Velk {
 using HostCtl::Lib::Syslog;
 
 bool WelcomeWindow::_noAdapterAlertRaised = false;
+std::string WelcomeWindow::_notice;
 
 namespace {
 
@@ -257,6 +258,7 @@ void WelcomeWindow::Fill() {
     if (!_processors) _processors = new TextArea(_upper, 8, 9, COLS - 16, 2, -1);
     if (!_network) _network = new TextArea(_lower, 8, 1, COLS - 16, kNetworkRows, BLACK);
     _network->SetText(network);
+    if (!_notice.empty()) warning += (warning.empty() ? "" : "\n") + TextArea::Escape(_notice);
     _warning->SetText(warning);
     _title->SetText(_factory->GetString(2));
     _hardware->SetText(hardware);
@@ -264,6 +266,8 @@ void WelcomeWindow::Fill() {
 }
 
 void WelcomeWindow::Update() { Draw(); }
+
+void WelcomeWindow::SetNotice(const std::string& line) { _notice = line; }
 
 void WelcomeWindow::OnLoginKey(int key) {
     if (!FileExists(kLoginMarker)) {
@@ -278,6 +282,7 @@ void WelcomeWindow::OnLoginKey(int key) {
         // Nobody finished logging in: the welcome screen is drawn again.
         return;
     }
+    _notice.clear();
     try {
         if (key == KEY_F(2)) {
             GeneralWindow menu(this);

@@ -19,6 +19,10 @@ public:
     int Run() override;
     void Update() override;
 
+    // A line shown with the warnings until the next login (a network change
+    // put back at start).
+    static void SetNotice(const std::string& line);
+
     // The hardware line: the product alone when it already begins with the
     // vendor, otherwise "vendor product" (both with their blanks tidied).
     static std::string CombineVendorAndProduct(const std::string& vendor, const std::string& product);
@@ -49,6 +53,7 @@ private:
 
     // The missing-adapter alert is raised at most once per run.
     static bool _noAdapterAlertRaised;
+    static std::string _notice;
 };
 
 }  // namespace Velk

@@ -700,6 +700,48 @@ const char* en_US_Factory::GetString(int id) {
             return "VLAN ID (1-4094, empty for none):";
         case 283:
             return "No adapter is selected. Select at least one adapter for the management network.";
+        case 284:
+            return "Management network checked: the change is kept.";
+        case 285:
+            return "Check Management Network";
+        case 286:
+            return "The management network failed a check after the change. The host may no longer be "
+                   "reachable over the network.";
+        case 287:
+            return "Passed";
+        case 288:
+            return "Failed";
+        case 289:
+            return "Warning";
+        case 290:
+            return "The previous configuration is put back in";
+        case 291:
+            return "seconds (any key restarts the count).";
+        case 292:
+            return "Keep Change";
+        case 293:
+            return "Revert Now";
+        case 294:
+            return "Management network checked: the previous configuration is back.";
+        case 295:
+            return "The previous configuration is back, but it failed a check too. Restoring the factory "
+                   "network settings may bring the host back on the network.";
+        case 296:
+            return "Restore Factory Settings";
+        case 297:
+            return "Leave As Is";
+        case 298:
+            return "A network change left unfinished was reverted at start.";
+        case 299:
+            return "The network configuration could not be saved; nothing was changed.";
+        case 300:
+            return "The previous network configuration could not be put back.";
+        case 301:
+            return "The IPv4 address is already in use on the management network; nothing was changed.";
+        case 302:
+            return "Management network: the change is kept although a check failed.";
+        case 303:
+            return "Checking the management network.";
         default:
             return "";
     }

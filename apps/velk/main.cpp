@@ -15,6 +15,7 @@
 
 #include "Console.hpp"
 #include "Frame.hpp"
+#include "NetworkTrial.hpp"
 #include "WelcomeWindow.hpp"
 #include "hostctl/Host.hpp"
 
@@ -119,6 +120,13 @@ int main(int argc, char** argv) {
     wnoutrefresh(stdscr);
     if (COLS < Velk::kMinColumns || LINES < Velk::kMinLines) Velk::Frame::RefuseSmallTerminal();
 
+    // A network change that a console left unfinished (it was killed while
+    // the change was on trial) is put back before anyone sees the network.
+    try {
+        Velk::WelcomeWindow::SetNotice(Velk::NetworkTrial::RecoverAtStart());
+    } catch (const HostCtl::Lib::HostCtlException& e) {
+        Syslog(LOG_ERR, "Putting back an unfinished network change failed: %s", e.what());
+    }
     Velk::WelcomeWindow* welcome = new Velk::WelcomeWindow();
     try {
         welcome->Execute();
