@@ -6,7 +6,8 @@
 #   tests/package/check-deb.sh dist/velk_VERSION_ARCH.deb
 set -euo pipefail
 deb="$1"
-contents="$(dpkg-deb -c "$deb" | awk '{print $6}' | sed 's|^\./|/|')"
+listing="$(dpkg-deb -c "$deb")"
+contents="$(awk '{print $6}' <<<"$listing" | sed 's|^\./|/|')"
 depends="$(dpkg-deb -f "$deb" Depends)"
 conffiles="$(dpkg-deb -I "$deb" conffiles 2>/dev/null || true)"
 failed=0
@@ -20,7 +21,7 @@ for path in /usr/sbin/velk /etc/pam.d/velk /usr/share/man/man8/velk.8.gz \
 done
 for tool in hrm-cmd tarncfg-advcfg tarncli localcli powerOffVms grabCIMData qelping firmwareConfig.sh \
             qelbacktrace; do
-  dpkg-deb -c "$deb" | grep -q -- " \./usr/libexec/velk/$tool -> velk-debian-tools$" ||
+  grep -q -- " \./usr/libexec/velk/$tool -> velk-debian-tools$" <<<"$listing" ||
     fail "missing the link /usr/libexec/velk/$tool"
 done
 if grep -E '^/(usr/)?s?bin/.' <<<"$contents" | grep -vx /usr/sbin/velk; then
