@@ -47,5 +47,7 @@ done
 for f in ../velk-dbgsym_"${version}"_"${arch}".deb ../velk-simhost-dbgsym_"${version}"_"${arch}".deb; do
   if [ -f "$f" ]; then mv -f "$f" dist/; fi
 done
+# The console's package holds what a Debian host needs.
+tests/package/check-deb.sh "dist/velk_${version}_${arch}.deb"
 echo "Packages in $here/dist:"
 ls -1 dist

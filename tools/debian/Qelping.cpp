@@ -6,6 +6,7 @@
 
 #include "DebianTools.hpp"
 #include "HostSystem.hpp"
+#include "QelpingArgs.hpp"
 
 namespace VelkDebian {
 
@@ -15,41 +16,6 @@ const char* const USAGE = "usage: qelping TARGET [-I INTERFACE]\n";
 const char* const PING = "/bin/ping";
 // ping waits 2 seconds for its answer; this bounds the whole run.
 const int PING_SECONDS = 10;
-
-struct Request {
-    std::string target;  // the address, without a scope
-    std::string scope;   // "fe80::1%eth0": "eth0"
-    std::string interface;
-};
-
-// "" when the arguments are fine, else the problem.
-std::string Parse(const Args& args, Request& request) {
-    bool haveTarget = false;
-    for (size_t i = 0; i < args.size(); ++i) {
-        if (args[i] == "-I") {
-            if (i + 1 >= args.size() || args[i + 1].empty()) return "-I needs an interface name";
-            request.interface = args[++i];
-        } else if (!args[i].empty() && args[i][0] == '-') {
-            return "unknown option " + args[i];
-        } else if (haveTarget) {
-            return "more than one target (" + request.target + ", " + args[i] + ")";
-        } else {
-            request.target = args[i];
-            haveTarget = true;
-        }
-    }
-    if (!haveTarget || request.target.empty()) return "no target given";
-    const size_t percent = request.target.find('%');
-    if (percent != std::string::npos) {
-        request.scope = request.target.substr(percent + 1);
-        request.target.erase(percent);
-        if (request.scope.empty()) return "the target's scope after '%' is empty";
-        if (!request.interface.empty() && request.interface != request.scope)
-            return "the target's scope " + request.scope + " is not the interface " + request.interface;
-        request.interface = request.scope;
-    }
-    return "";
-}
 
 bool IsInterfaceName(const std::string& name) {
     if (name.empty() || name.size() > 15 || name == "." || name == "..") return false;
@@ -61,8 +27,8 @@ bool IsInterfaceName(const std::string& name) {
 }  // namespace
 
 int Qelping(const Args& args) {
-    Request request;
-    if (const std::string problem = Parse(args, request); !problem.empty()) {
+    VelkTools::QelpingRequest request;
+    if (const std::string problem = VelkTools::ParseQelpingArgs(args, request); !problem.empty()) {
         Complain("qelping: " + problem + "\n" + USAGE);
         return 2;
     }

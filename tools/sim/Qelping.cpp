@@ -12,6 +12,7 @@
 #include <thread>
 
 #include "HostCommands.hpp"
+#include "QelpingArgs.hpp"
 #include "hostctl/HostCtl.hpp"
 #include "hostctl/SimNetwork.hpp"
 
@@ -26,41 +27,6 @@ const char* const USAGE = "usage: qelping TARGET [-I INTERFACE]\n";
 // The longest wait a state may ask for, so that a typing error cannot hang
 // the console's test for days.
 const int64_t MOST_MS = 600000;
-
-struct Request {
-    std::string target;
-    std::string vnic;  // "" for the management interface
-};
-
-// "" when the arguments are fine, else the problem.
-std::string Parse(const std::vector<std::string>& args, Request& request) {
-    bool haveTarget = false;
-    for (size_t i = 0; i < args.size(); ++i) {
-        if (args[i] == "-I") {
-            if (i + 1 >= args.size() || args[i + 1].empty()) return "-I needs an interface name";
-            request.vnic = args[++i];
-        } else if (!args[i].empty() && args[i][0] == '-') {
-            return "unknown option " + args[i];
-        } else if (haveTarget) {
-            return "more than one target (" + request.target + ", " + args[i] + ")";
-        } else {
-            request.target = args[i];
-            haveTarget = true;
-        }
-    }
-    if (!haveTarget || request.target.empty()) return "no target given";
-    // "fe80::1%qk0": the scope names the interface.
-    const size_t percent = request.target.find('%');
-    if (percent != std::string::npos) {
-        const std::string scope = request.target.substr(percent + 1);
-        request.target.erase(percent);
-        if (scope.empty()) return "the target's scope after '%' is empty";
-        if (!request.vnic.empty() && request.vnic != scope)
-            return "the target's scope " + scope + " is not the interface " + request.vnic;
-        request.vnic = scope;
-    }
-    return "";
-}
 
 // A wait in milliseconds from `object`'s `field` (`what` names it in
 // errors), or `fallback` when the field is missing.
@@ -83,9 +49,9 @@ bool HasVnic(const SimState& sim, const json& state, const std::string& vnic) {
 }  // namespace
 
 int Qelping(SimState& sim, const std::vector<std::string>& args, std::string& out, std::string& err) {
-    Request request;
+    QelpingRequest request;
     int status = -1;  // -1 until known
-    if (const std::string problem = Parse(args, request); !problem.empty()) {
+    if (const std::string problem = ParseQelpingArgs(args, request); !problem.empty()) {
         err = "qelping: " + problem + "\n" + USAGE;
         status = 2;
     } else if (!HostCtl::Network::Ipv4Address::IsValidAddress(request.target) &&
@@ -99,8 +65,9 @@ int Qelping(SimState& sim, const std::vector<std::string>& args, std::string& ou
     json seq;
     sim.Update([&](json& state) {
         if (status < 0) {
-            const std::string vnic =
-                request.vnic.empty() ? sim.String(state, "/network/managementInterface") : request.vnic;
+            const std::string vnic = request.interface.empty()
+                                         ? sim.String(state, "/network/managementInterface")
+                                         : request.interface;
             if (vnic.empty()) {
                 err = "qelping: the host has no management interface to send from\n";
                 status = 2;

@@ -184,6 +184,12 @@ TEST(InterfacesFileTest, EditsChangeOnlyTheirLines) {
                              "\niface vmbr0 inet6 static\n        address 2001:db8::10/64\n");
          }()},
         {VMBR, [](InterfacesFile& f) { f.RemoveStanza(f.AddIface("vmbr0", "inet6", "auto")); }, VMBR},
+        // An indented comment after the options stays with its stanza.
+        {"iface vmbr0 inet static\n\taddress 192.0.2.10/24\n\t# VM ports come and go\n# next\n",
+         [](InterfacesFile& f) { f.AddIface("vmbr0", "inet6", "auto"); },
+         "iface vmbr0 inet static\n\taddress 192.0.2.10/24\n\t# VM ports come and go\n\niface vmbr0 inet6 "
+         "auto\n"
+         "# next\n"},
         // Capitalised and repeated names, a continuation line, CRLF and no
         // final line end, a stanza with no options and one without a method.
         {CRLF,

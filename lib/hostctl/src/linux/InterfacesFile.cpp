@@ -341,7 +341,16 @@ size_t InterfacesFile::AddIface(const std::string& name, const std::string& fami
         RequireValue(value);
     }
     const std::vector<size_t> same = FindIface(name);
-    const size_t after = same.empty() ? std::string::npos : _places[same.back()].last;
+    size_t after = same.empty() ? std::string::npos : _places[same.back()].last;
+    // Indented comments right after the stanza's options are the stanza's
+    // own: the new stanza goes after them.
+    while (after != std::string::npos && after + 1 < _lines.size() &&
+           _lines[after + 1].kind == Line::Comment) {
+        const std::string& text = _text;
+        const size_t begin = _lines[after + 1].begin;
+        if (begin >= text.size() || (text[begin] != ' ' && text[begin] != '\t')) break;
+        ++after;
+    }
     const std::string indent = same.empty() ? "\t" : Indent(same.back());
 
     std::vector<std::string> lines;

@@ -668,7 +668,22 @@ public:
     }
 
     void SetVnicIpConfig(const std::string& vnic, const Network::IpConfig& config) override {
-        Stage(vnic, [&](PendingChange& c) { c.ip = config; });
+        Stage(vnic, [&](PendingChange& c) {
+            c.ip = config;
+            // A lease's gateway stays the host's gateway when the address
+            // becomes static in the same subnet (a gateway set in the same
+            // change replaces it).
+            if (c.gateway4 || config.GetUseDhcp() || config.GetIpv4UseNone()) return;
+            NetworkModel model(Configuration());
+            const auto route = model.Snapshot().DefaultRoute(false);
+            const LinkInfo* link = route ? model.Snapshot().FindLink(route->linkIndex) : nullptr;
+            if (link == nullptr || link->name != c.iface || !Ipv4Address::IsValidAddress(route->gateway))
+                return;
+            const uint32_t mask = config.GetIpv4Netmask().GetHostOrder();
+            if ((Ipv4Address(route->gateway).GetHostOrder() & mask) ==
+                (config.GetIpv4Address().GetHostOrder() & mask))
+                c.gateway4 = route->gateway;
+        });
     }
 
     void RenewVnicDhcpLease(const std::string& vnic) override {
@@ -886,9 +901,14 @@ public:
         EditResolver([&](Resolver& r) { r.search = domains; });
     }
 
-    // The resolver file is the saved configuration itself; the interfaces
-    // file is written with each change.
-    void SaveConfig(const std::string&) override {}
+    // The resolver file is the saved configuration itself and the interfaces
+    // file is written with each change; the kernel's host name is saved for
+    // the next boot.
+    void SaveConfig(const std::string&) override {
+        const std::string name = ShortHostName();
+        const std::string saved = FirstLine("/etc/hostname");
+        if (saved.substr(0, saved.find('.')) != name) ReplaceSystemFile("/etc/hostname", name + "\n");
+    }
 
     // System.
 

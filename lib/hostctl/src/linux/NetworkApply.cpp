@@ -1,14 +1,17 @@
 // Changing the management interface of a Debian host.
 #include "NetworkApply.hpp"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <syslog.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <cstdlib>
 #include <exception>
+#include <cstring>
 #include <filesystem>
 #include <nlohmann/json.hpp>
 #include <thread>
@@ -27,10 +30,14 @@ using Network::Ipv6AddressType;
 // vnetN, and tapN/fwprN/vethN of Proxmox-style hosts.
 const char* const VM_PORTS = "^(tap|veth|fwpr|vnet)";
 
-// How long the engine and the kernel get.
-constexpr int ENGINE_MS = 35000;  // ifup waits for a DHCP lease about 30 s at most
+// How long the engine and the kernel get. ifup waits about a minute for a
+// lease nobody gives: a change waiting for DHCP ends after DHCP_MS in all,
+// the tool's run included.
+constexpr int ENGINE_MS = 35000;
 constexpr int STATIC_MS = 10000;
 constexpr int DHCP_MS = 30000;
+
+using Clock = std::chrono::steady_clock;
 
 bool Exists(const std::string& hostPath) {
     struct stat st {};
@@ -245,17 +252,30 @@ bool Shows(const PendingChange& change, std::string& missing) {
     return true;
 }
 
-void Run(const std::vector<std::string>& argv, const std::string& what) {
+void Run(const std::vector<std::string>& argv, const std::string& what, int boundMs = ENGINE_MS) {
     std::string output;
-    const int status = RunBounded(argv, ENGINE_MS, &output);
+    const int status = RunBounded(argv, std::max(1000, boundMs), &output);
     std::string line = argv[0];
     for (size_t i = 1; i < argv.size(); ++i) line += " " + argv[i];
     if (status == -1)
-        Syslog(LOG_WARNING, "%s: %s did not end within %d s", what.c_str(), line.c_str(), ENGINE_MS / 1000);
+        Syslog(LOG_WARNING, "%s: %s did not end within %d s", what.c_str(), line.c_str(), boundMs / 1000);
     // The tools' status is no proof either way: the kernel's state is.
     else if (status != 0)
         Syslog(LOG_WARNING, "%s: %s ended with status %d: %s", what.c_str(), line.c_str(), status,
                output.c_str());
+}
+
+// ifupdown2 reads accept_ra and autoconf only in a DHCPv6 stanza, and turns
+// forwarding on for bridges (the kernel then ignores router advertisements
+// unless accept_ra is 2): the running kernel's switches are set here.
+void EnableRouterAdvertisements(const std::string& iface) {
+    for (const auto& [key, value] : {std::pair{"accept_ra", "2\n"}, std::pair{"autoconf", "1\n"}}) {
+        const std::string path = HostPath("/proc/sys/net/ipv6/conf/" + iface + "/" + key);
+        const int fd = open(path.c_str(), O_WRONLY | O_CLOEXEC);
+        if (fd < 0 || write(fd, value, 2) != 2)
+            Syslog(LOG_WARNING, "Setting %s: %s", path.c_str(), std::strerror(errno));
+        if (fd >= 0) close(fd);
+    }
 }
 
 }  // namespace
@@ -303,11 +323,12 @@ void KeepFiles(const InterfacesFiles& files) {
     }
 }
 
-void WaitFor(const PendingChange& change, int ms, const std::string& what) {
-    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
+// Waits until the kernel shows the change, at most until `ms` after `start`.
+void WaitFor(const PendingChange& change, Clock::time_point start, int ms, const std::string& what) {
+    const auto deadline = start + std::chrono::milliseconds(ms);
     std::string missing;
     while (!Shows(change, missing)) {
-        if (std::chrono::steady_clock::now() >= deadline)
+        if (Clock::now() >= deadline)
             throw HostCtlException(what + ": " + missing + " did not appear within " +
                                    std::to_string(ms / 1000) + " s");
         std::this_thread::sleep_for(std::chrono::milliseconds(100));
@@ -324,19 +345,26 @@ void ApplyChange(const PendingChange& change) {
     const std::vector<InterfacesFiles::Change> changes = files.Changes();
     KeepFiles(files);
     const std::string what = "applying the network configuration of " + change.iface;
+    const bool dhcp = change.ip && (change.ip->GetUseDhcp() || change.ip->GetUseIpv6Dhcp());
+    const auto start = Clock::now();
+    const auto left = [&] {
+        const auto spent = std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start);
+        return dhcp ? DHCP_MS - int(spent.count()) : ENGINE_MS;
+    };
     if (engine == Engine::Ifupdown) {
         // Down with the old stanza and without the hook scripts: the bridge,
         // its ifindex and its VM ports stay; only the addresses go.
-        Run({"/sbin/ifdown", "--no-scripts", "--force", change.iface}, what);
+        Run({"/sbin/ifdown", "--no-scripts", "--force", change.iface}, what, left());
     }
     for (const auto& c : changes) ReplaceFile(HostPath(c.path), c.text, c.mode);
     if (engine == Engine::Ifupdown)
-        Run({"/sbin/ifup", change.iface}, what);
+        Run({"/sbin/ifup", change.iface}, what, left());
     else
-        Run({"/sbin/ifreload", "-a"}, what);
+        Run({"/sbin/ifreload", "-a"}, what, left());
+    if (engine == Engine::Ifupdown2 && change.ip && change.ip->GetUseIpv6RouterAdvertised())
+        EnableRouterAdvertisements(change.iface);
 
-    const bool dhcp = change.ip && (change.ip->GetUseDhcp() || change.ip->GetUseIpv6Dhcp());
-    WaitFor(change, dhcp ? DHCP_MS : STATIC_MS, what);
+    WaitFor(change, dhcp ? start : Clock::now(), dhcp ? DHCP_MS : STATIC_MS, what);
     Syslog(LOG_INFO, "Applied the network configuration of %s", change.iface.c_str());
 }
 
@@ -360,19 +388,24 @@ void ApplyFactoryLayout(const std::string& oldIface, const std::string& bridge, 
     if (files.Files().empty()) throw HostCtlException("/etc/network/interfaces: the file cannot be read");
     KeepFiles(files);
     const std::string what = "restoring the network";
+    const auto start = Clock::now();
+    const auto left = [&] {
+        return DHCP_MS -
+               int(std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start).count());
+    };
     if (engine == Engine::Ifupdown && !oldIface.empty())
-        Run({"/sbin/ifdown", "--no-scripts", "--force", oldIface}, what);
+        Run({"/sbin/ifdown", "--no-scripts", "--force", oldIface}, what, left());
     const auto& main = files.Files().front();
     ReplaceFile(HostPath(main.path), FactoryLayout(bridge, uplink, nics, engine), main.mode);
     if (engine == Engine::Ifupdown)
-        Run({"/sbin/ifup", bridge}, what);
+        Run({"/sbin/ifup", bridge}, what, left());
     else
-        Run({"/sbin/ifreload", "-a"}, what);
+        Run({"/sbin/ifreload", "-a"}, what, left());
     PendingChange lease;
     lease.iface = bridge;
     lease.ip.emplace();
     lease.ip->SetUseDhcp(true);
-    WaitFor(lease, DHCP_MS, what);
+    WaitFor(lease, start, DHCP_MS, what);
     Syslog(LOG_INFO, "Restored the network: %s on %s with DHCP", bridge.c_str(), uplink.c_str());
 }
 
