@@ -10,8 +10,8 @@
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
-#include <exception>
 #include <cstring>
+#include <exception>
 #include <filesystem>
 #include <nlohmann/json.hpp>
 #include <thread>
@@ -485,6 +485,13 @@ void PutBackFiles(const std::string& saved, const std::string& iface,
         throw HostCtlException("putting back the network configuration: no interfaces file saved");
     const Engine engine = DetectEngine();
     const std::string what = "putting back the network configuration of " + iface;
+    const PendingChange expected = SavedChange(files, iface);
+    const bool dhcp = expected.ip->GetUseDhcp();
+    const auto start = Clock::now();
+    const auto left = [&] {
+        const auto spent = std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start);
+        return dhcp ? DHCP_MS - int(spent.count()) : ENGINE_MS;
+    };
     // A write that fails must not leave the interface down: the engine runs
     // anyway, and the failure is told afterwards.
     std::exception_ptr failed;
@@ -506,22 +513,21 @@ void PutBackFiles(const std::string& saved, const std::string& iface,
     if (engine == Engine::Ifupdown) {
         // Down with the files in force (they know what is up), without the
         // hook scripts: the bridge and its VM ports stay.
-        Run({"/sbin/ifdown", "--no-scripts", "--force", iface}, what);
+        Run({"/sbin/ifdown", "--no-scripts", "--force", iface}, what, left());
         write(false);
         besides();
-        Run({"/sbin/ifup", iface}, what);
+        Run({"/sbin/ifup", iface}, what, left());
     } else {
         // ifreload takes VM ports off a bridge its file does not condone
         // them on: it reads the saved files with them condoned, and the
         // files then go back byte for byte.
         write(true);
         besides();
-        Run({"/sbin/ifreload", "-a"}, what);
+        Run({"/sbin/ifreload", "-a"}, what, left());
         write(false);
     }
     if (failed) std::rethrow_exception(failed);
-    const PendingChange expected = SavedChange(files, iface);
-    WaitFor(expected, expected.ip->GetUseDhcp() ? DHCP_MS : STATIC_MS, what);
+    WaitFor(expected, dhcp ? start : Clock::now(), dhcp ? DHCP_MS : STATIC_MS, what);
     Syslog(LOG_INFO, "Put back the saved network configuration of %s", iface.c_str());
 }
 
