@@ -14,9 +14,10 @@ namespace {
 
 constexpr int kWidth = 72;
 constexpr int kHeaderHeight = 7;
-// Rows of the body around the list: a blank row and the count below it, and
-// the body's own frame and footer.
-constexpr int kBodyRows = 2 + 4;
+// Rows of the body around the list: a blank row and the count's two rows
+// below it (the count wraps on an 80-column screen), and the body's own
+// frame and footer.
+constexpr int kBodyRows = 3 + 4;
 constexpr long kTickMillis = 1000;
 
 }  // namespace
@@ -25,8 +26,8 @@ NetworkCheckWindow::NetworkCheckWindow(Frame* parent, Stage stage, const std::ve
     : Dialog(parent, kWidth, Height(checks.size()), kHeaderHeight), _stage(stage), _checks(checks) {
     const int width = _content->GetWidth();
     const int rows = _content->GetHeight();
-    _list = new TextArea(_content, 0, 0, width, std::max(1, rows - 2), BLACK);
-    _countdown = new TextArea(_content, 0, rows - 1, width, 1, BLACK);
+    _list = new TextArea(_content, 0, 0, width, std::max(1, rows - 3), BLACK);
+    _countdown = new TextArea(_content, 0, std::max(0, rows - 2), width, 2, BLACK);
 }
 
 // As many rows as the checks need, within the screen.

@@ -3,6 +3,7 @@
 #include <syslog.h>
 
 #include <cstring>
+#include <optional>
 
 #include "CommandRunner.hpp"
 #include "MessageDialog.hpp"
@@ -47,16 +48,22 @@ NetworkTrial::NetworkTrial(Frame* screen) : _screen(screen), _factory(StringFact
 NetworkTrial::~NetworkTrial() { PutBackQuietly("reverted"); }
 
 bool NetworkTrial::AddressFree(Frame* screen, const HostCtl::Network::Ipv4Address& address) {
+    StringFactory* factory = StringFactory::Get("en_US");
+    std::optional<std::string> inUse;
     try {
-        NetworkTrialImpl().ProbeAddress(address);
-        return true;
+        inUse = NetworkTrialImpl().ProbeAddress(address);
     } catch (const HostCtlException& e) {
-        Syslog(LOG_ERR, "Address %s refused: %s", address.GetStringAddress().c_str(), e.what());
-        const std::string message =
-            std::string(StringFactory::Get("en_US")->GetString(301)) + "\n\n" + e.what();
-        MessageDialog(screen, 18, message).Execute();
-        return false;
+        // A probe that cannot be made says nothing about the address: the
+        // operator may still change it, and the checks after the change find
+        // a duplicate address all the same.
+        Syslog(LOG_WARNING, "Probing for %s failed: %s", address.GetStringAddress().c_str(), e.what());
+        MessageDialog(screen, 18, std::string(factory->GetString(304)) + "\n\n" + e.what()).Execute();
+        return true;
     }
+    if (!inUse) return true;
+    Syslog(LOG_ERR, "Address %s refused: %s", address.GetStringAddress().c_str(), inUse->c_str());
+    MessageDialog(screen, 18, std::string(factory->GetString(301)) + "\n\n" + *inUse).Execute();
+    return false;
 }
 
 bool NetworkTrial::Begin() {

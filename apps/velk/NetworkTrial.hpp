@@ -30,7 +30,9 @@ public:
 
     // Whether `address` is free on the management interface's link; when
     // another machine answers for it, the operator is told and false comes
-    // back. An address that cannot be probed counts as free.
+    // back. When the probe itself fails the operator is warned and the
+    // address counts as free: the checks after the change still catch a
+    // duplicate.
     static bool AddressFree(Frame* screen, const HostCtl::Network::Ipv4Address& address);
 
     // Saves the present configuration for the logged-in user. False, after

@@ -742,6 +742,9 @@ const char* en_US_Factory::GetString(int id) {
             return "Management network: the change is kept although a check failed.";
         case 303:
             return "Checking the management network.";
+        case 304:
+            return "The management network could not be probed for another machine using the IPv4 address. "
+                   "The change is applied and checked afterwards.";
         default:
             return "";
     }

@@ -29,7 +29,7 @@ public:
     // system-version record.
     static std::string FormatHeading(const char* record);
 
-    static constexpr int LAST_ID = 303;
+    static constexpr int LAST_ID = 304;
 
 private:
     const char* Heading();

@@ -44,9 +44,9 @@ public:
     // (the tool's default text when empty) until Clear is called for it.
     void Fail(const std::string& operation, const std::string& message = "");
     void Clear(const std::string& operation);
-    // Makes the calls of a host tool ("qelbacktrace", or "services.sh stop"
-    // for the calls with that argument) wait `seconds` before they act; 0
-    // clears it.
+    // Makes the calls of a host control operation ("SetDefaultGateway") or a
+    // host tool ("qelbacktrace", or "services.sh stop" for the calls with
+    // that argument) wait `seconds` before they act; 0 clears it.
     void Slow(const std::string& tool, double seconds);
     // Completes a reboot: the host comes up with its saved configuration.
     void Boot();

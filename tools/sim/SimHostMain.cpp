@@ -3,6 +3,7 @@
 //   velk-simhost boot ROOT
 //   velk-simhost fail ROOT 'OPERATION [WORD]' [MESSAGE | --clear]
 //   velk-simhost fail ROOT 'TOOL [WORD]' [STDERR | --clear]
+//   velk-simhost slow ROOT 'OPERATION [WORD]' SECONDS
 //   velk-simhost slow ROOT 'TOOL [WORD]' SECONDS
 //   velk-simhost login ROOT
 //   velk-simhost get ROOT POINTER
@@ -39,6 +40,7 @@ const char* const USAGE =
     "       velk-simhost boot ROOT\n"
     "       velk-simhost fail ROOT 'OPERATION [WORD]' [MESSAGE | --clear]\n"
     "       velk-simhost fail ROOT 'TOOL [WORD]' [STDERR | --clear]\n"
+    "       velk-simhost slow ROOT 'OPERATION [WORD]' SECONDS\n"
     "       velk-simhost slow ROOT 'TOOL [WORD]' SECONDS\n"
     "       velk-simhost login ROOT\n"
     "       velk-simhost get ROOT POINTER\n"
@@ -66,7 +68,8 @@ const char* const USAGE =
     "  poweroff, firmwareConfig.sh, grabCIMData), every call of the tool, or with WORD every\n"
     "  call that has WORD among its arguments ('hrm-cmd hostsvc/start_ssh', 'services.sh stop'),\n"
     "  prints STDERR on its standard error and exits with status 1 without changing anything.\n"
-    "slow: makes those calls of a host tool wait SECONDS before they act (0 clears).\n";
+    "slow: makes those calls of a host control operation or a host tool wait SECONDS before\n"
+    "  they act (0 clears).\n";
 
 int Usage(const std::string& problem) {
     if (!problem.empty()) std::fprintf(stderr, "velk-simhost: %s\n", problem.c_str());
@@ -165,21 +168,30 @@ int Boot(const std::vector<std::string>& args) {
     return 0;
 }
 
+// Whether `name` ('OPERATION [WORD]') names a host control operation; the
+// problem goes to standard error when it names neither one nor a host tool.
+bool IsOperationName(const std::string& name, bool& known) {
+    const std::vector<std::string>& operations = HostCtl::Lib::SimulatedOperations();
+    const std::string named = name.substr(0, name.find(' '));
+    known = true;
+    if (std::find(operations.begin(), operations.end(), named) != operations.end()) return true;
+    if (VelkTools::IsToolFaultName(name)) return false;
+    std::string list, tools;
+    for (const std::string& operation : operations) list += (list.empty() ? "" : " ") + operation;
+    for (const std::string& tool : VelkTools::ToolNames()) tools += (tools.empty() ? "" : " ") + tool;
+    Error("unknown operation \"" + name + "\"; the operations are: " + list + "; the tools are: " + tools);
+    known = false;
+    return false;
+}
+
 // Sets or clears a fault: the named host control operation, or the calls of
 // a host tool, fail with the message until the fault is cleared.
 int Fail(const std::vector<std::string>& args) {
     if (args.size() < 2 || args.size() > 3) return Usage("fail takes ROOT OPERATION [MESSAGE | --clear]");
     const std::string& operation = args[1];
-    const std::vector<std::string>& known = HostCtl::Lib::SimulatedOperations();
-    const bool tool = VelkTools::IsToolFaultName(operation);
-    const std::string named = operation.substr(0, operation.find(' '));
-    if (!tool && std::find(known.begin(), known.end(), named) == known.end()) {
-        std::string list, tools;
-        for (const std::string& name : known) list += (list.empty() ? "" : " ") + name;
-        for (const std::string& name : VelkTools::ToolNames()) tools += (tools.empty() ? "" : " ") + name;
-        return Error("unknown operation \"" + operation + "\"; the operations are: " + list +
-                     "; the tools are: " + tools);
-    }
+    bool known = false;
+    const bool tool = !IsOperationName(operation, known);
+    if (!known) return 1;
     const bool clear = args.size() == 3 && args[2] == "--clear";
     const std::string message = args.size() == 3 ? args[2] : "simulated failure of " + operation;
     if (!clear && message.empty()) return Usage("the message of a fault may not be empty");
@@ -195,11 +207,14 @@ int Fail(const std::vector<std::string>& args) {
     return 0;
 }
 
-// Makes the calls of a host tool wait before they act, or (0) no longer.
+// Makes the calls of a host control operation or a host tool wait before
+// they act, or (0) no longer.
 int Slow(const std::vector<std::string>& args) {
-    if (args.size() != 3) return Usage("slow takes ROOT 'TOOL [WORD]' SECONDS");
+    if (args.size() != 3) return Usage("slow takes ROOT 'OPERATION [WORD]' SECONDS");
     const std::string& name = args[1];
-    if (!VelkTools::IsToolFaultName(name)) return Error("\"" + name + "\" does not name a host tool");
+    bool known = false;
+    const bool tool = !IsOperationName(name, known);
+    if (!known) return 1;
     double seconds = -1;
     try {
         size_t used = 0;
@@ -211,7 +226,7 @@ int Slow(const std::vector<std::string>& args) {
     HostCtl::Lib::SimState sim(args[0]);
     sim.Read();
     sim.Update([&](json& state) {
-        json& delays = VelkTools::ObjectMember(sim, state, "", "toolDelays");
+        json& delays = VelkTools::ObjectMember(sim, state, "", tool ? "toolDelays" : "delays");
         if (seconds == 0)
             delays.erase(name);
         else

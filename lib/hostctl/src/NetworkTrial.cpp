@@ -157,13 +157,12 @@ std::string Piece(const std::string& label, const std::function<std::string()>& 
 
 }  // namespace
 
-void NetworkTrialImpl::ProbeAddress(const HostCtl::Network::Ipv4Address& address) {
+std::optional<std::string> NetworkTrialImpl::ProbeAddress(const HostCtl::Network::Ipv4Address& address) {
     const std::string vnic = GetBackend().GetManagementInterfaceName();
-    if (vnic.empty()) return;  // no link to ask on
+    if (vnic.empty()) return std::nullopt;  // no link to ask on
     const std::optional<std::string> who = GetBackend().ProbeIpv4Address(vnic, address);
-    if (who)
-        throw HostCtlException(address.GetStringAddress() + " is already used on the management network by " +
-                               *who);
+    if (!who) return std::nullopt;
+    return address.GetStringAddress() + " is already used on the management network by " + *who;
 }
 
 void NetworkTrialImpl::Save(const std::string& user) {

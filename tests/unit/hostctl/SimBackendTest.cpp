@@ -1,5 +1,6 @@
 // The host control operations on a simulated host: what one write leaves for
 // the next read, and the packing of the version record.
+#include <chrono>
 #include <cstring>
 #include <filesystem>
 
@@ -337,17 +338,16 @@ TEST_F(SimBackendTest, NetworkChecksFindWhatCutsTheHostOff) {
     // Before the change: who answers for an address is named; a free one,
     // the host's own lease and an address asked without link pass.
     Reset();
-    try {
-        trial.ProbeAddress(Ipv4Address("192.0.2.53"));
-        ADD_FAILURE() << "a held address passed the probe";
-    } catch (const HostCtlException& e) {
-        EXPECT_EQ(std::string(e.what()),
-                  "192.0.2.53 is already used on the management network by a machine on VLAN 0");
-    }
-    EXPECT_NO_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.9")));
-    EXPECT_NO_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.100")));
+    EXPECT_EQ(trial.ProbeAddress(Ipv4Address("192.0.2.53")),
+              "192.0.2.53 is already used on the management network by a machine on VLAN 0");
+    EXPECT_EQ(trial.ProbeAddress(Ipv4Address("192.0.2.9")), std::nullopt);
+    EXPECT_EQ(trial.ProbeAddress(Ipv4Address("192.0.2.100")), std::nullopt);
+    // A probe that cannot be made is an error, not an answer.
+    Edit(Set("/faults/ProbeIpv4Address", "no raw socket"));
+    EXPECT_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.53")), HostCtlException);
+    Reset();
     Edit(Set("/network/pnics/0/linkUp", false));
-    EXPECT_NO_THROW(trial.ProbeAddress(Ipv4Address("192.0.2.53")));
+    EXPECT_EQ(trial.ProbeAddress(Ipv4Address("192.0.2.53")), std::nullopt);
 }
 
 // Saved, changed, put back: everything the network settings change returns,
@@ -558,6 +558,21 @@ TEST_F(SimBackendTest, EveryOperationFailsAsToldAndChangesNothing) {
     Reset();
     Edit([](json& s) { s["faults"] = "GetPnics"; });
     EXPECT_THROW(backend.GetPnics(), HostCtlException);
+
+    // A delay holds the call back, then it acts (or fails) as it would.
+    Reset();
+    Edit([](json& s) {
+        s["delays"] = {{"AddNameServer 192.0.2.9", 0.3}};
+        s["faults"] = {{"GetDns", "refused"}};
+    });
+    auto start = std::chrono::steady_clock::now();
+    EXPECT_NO_THROW(backend.AddNameServer("defaultTcpipStack", IpAddress("192.0.2.8")));
+    EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(300));
+    Edit([](json& s) { s["delays"]["GetDns"] = 0.3; });
+    start = std::chrono::steady_clock::now();
+    EXPECT_NO_THROW(backend.AddNameServer("defaultTcpipStack", IpAddress("192.0.2.9")));
+    ExpectRefused([&] { backend.GetDns("defaultTcpipStack"); }, "refused");
+    EXPECT_GE(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(600));
 }
 
 // A Debian host's backend refuses what such a host does not have with a text

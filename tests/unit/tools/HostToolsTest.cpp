@@ -189,9 +189,11 @@ TEST_F(HostTools, ToolFaultsAndDelaysByToolOrWord) {
     ASSERT_EQ(SimHost({"fail", _root, "SSH start", "ssh: port 22 in use"}).status, 0);
     ASSERT_EQ(SimHost({"fail", _root, "tarncfg-advcfg"}).status, 0);
     ASSERT_EQ(SimHost({"slow", _root, "SSH status", "0.4"}).status, 0);
+    // A host control operation is slowed in a table of its own.
+    ASSERT_EQ(SimHost({"slow", _root, "GetPnics", "1"}).status, 0);
     // Refused: unknown names, delays that are no number of seconds.
     EXPECT_TRUE(Fails(SimHost({"fail", _root, "sshd start", "x"})));
-    EXPECT_TRUE(Fails(SimHost({"slow", _root, "GetPnics", "1"})));
+    EXPECT_TRUE(Fails(SimHost({"slow", _root, "GetPnicz", "1"})));
     EXPECT_TRUE(Fails(SimHost({"slow", _root, "qelbacktrace", "-1"})));
     EXPECT_TRUE(Fails(SimHost({"slow", _root, "qelbacktrace", "soon"})));
 
@@ -216,6 +218,7 @@ TEST_F(HostTools, ToolFaultsAndDelaysByToolOrWord) {
     state = State();
     EXPECT_EQ(state["services"]["ssh"]["running"], true);
     EXPECT_EQ(state["toolDelays"], json::object());
+    EXPECT_EQ(state["delays"], json({{"GetPnics", 1.0}}));
     EXPECT_EQ(state["toolFaults"], json({{"tarncfg-advcfg", "simulated failure of tarncfg-advcfg"}}));
 }
 

@@ -5,6 +5,7 @@
 
 #include <cstddef>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -166,9 +167,11 @@ struct NetworkCheck {
 // configuration is put back before anything else.
 class NetworkTrialImpl {
 public:
-    // Throws HostCtlException naming who answered when another machine on
-    // the management interface's link already uses `address`.
-    void ProbeAddress(const HostCtl::Network::Ipv4Address& address);
+    // When another machine on the management interface's link already uses
+    // `address`: a line naming who answered; nothing when it is free (or
+    // there is no link to ask on). Throws HostCtlException when the probe
+    // itself fails, which tells nothing about the address.
+    std::optional<std::string> ProbeAddress(const HostCtl::Network::Ipv4Address& address);
     // Saves the present network configuration (files and running state)
     // with the marker, `user` recorded as who changes it. Throws
     // HostCtlException when it cannot be saved; nothing is then changed.

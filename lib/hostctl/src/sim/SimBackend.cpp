@@ -6,12 +6,14 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <climits>
 #include <csignal>
 #include <cstdint>
 #include <cstring>
 #include <functional>
 #include <stdexcept>
+#include <thread>
 #include <utility>
 
 #include "HostShell.hpp"
@@ -905,6 +907,7 @@ private:
     auto Reading(const char* operation, Read read) -> decltype(read(std::declval<const json&>())) {
         std::shared_ptr<const json> state = _sim.Read();
         try {
+            if (Delay(*state, operation)) state = _sim.Read();
             CheckFault(*state, operation);
             return read(*state);
         } catch (const json::exception& e) {
@@ -919,6 +922,7 @@ private:
     void Writing(const char* operation, const std::function<void(json&)>& change, json args = json::array()) {
         std::string hostname, domain, entry;
         try {
+            Delay(*_sim.Read(), operation, args);
             _sim.Update(
                 [&](json& s) {
                     CheckFault(s, operation, args);
@@ -941,23 +945,44 @@ private:
         }
     }
 
-    // A fault named by the operation and one of the call's arguments
+    // The entry of `table` ("faults" or "delays") for a call of `operation`:
+    // one named by the operation and one of the call's arguments
     // ("AddNameServer 198.51.100.53") applies to the calls with that argument
     // only, and wins over one named by the operation alone.
-    void CheckFault(const json& s, const char* operation, const json& args = json::array()) const {
+    const json* Entry(const json& s, const char* table, const char* operation, const json& args) const {
         if (!IsSimulatedOperation(operation))
             throw std::logic_error(std::string("unlisted operation ") + operation);
-        const auto faults = s.find("faults");
-        if (faults == s.end() || faults->is_null()) return;
-        if (!faults->is_object()) throw _sim.Error("field /faults must be an object");
-        auto fault = faults->end();
-        for (const json& arg : args)
-            if (arg.is_string() && fault == faults->end())
-                fault = faults->find(std::string(operation) + " " + arg.get<std::string>());
-        if (fault == faults->end()) fault = faults->find(operation);
-        if (fault == faults->end()) return;
-        if (!fault->is_string()) throw _sim.Error("field /faults/" + fault.key() + " must be a string");
+        const auto found = s.find(table);
+        if (found == s.end() || found->is_null()) return nullptr;
+        if (!found->is_object()) throw _sim.Error(std::string("field /") + table + " must be an object");
+        for (const json& arg : args) {
+            if (!arg.is_string()) continue;
+            const auto entry = found->find(std::string(operation) + " " + arg.get<std::string>());
+            if (entry != found->end()) return &*entry;
+        }
+        const auto entry = found->find(operation);
+        return entry == found->end() ? nullptr : &*entry;
+    }
+
+    void CheckFault(const json& s, const char* operation, const json& args = json::array()) const {
+        const json* fault = Entry(s, "faults", operation, args);
+        if (!fault) return;
+        if (!fault->is_string())
+            throw _sim.Error(std::string("field /faults/") + operation + " must be a string");
         throw HostCtlException(fault->get<std::string>());
+    }
+
+    // An operation with a delay takes that long before it acts, like a
+    // host whose network stack is slow to answer. It waits outside the
+    // state's lock: the host's tools and other consoles go on meanwhile.
+    // True when it waited (the state may have changed).
+    bool Delay(const json& s, const char* operation, const json& args = json::array()) const {
+        const json* delay = Entry(s, "delays", operation, args);
+        if (!delay) return false;
+        if (!delay->is_number() || delay->get<double>() < 0)
+            throw _sim.Error(std::string("field /delays/") + operation + " must be a number of seconds");
+        std::this_thread::sleep_for(std::chrono::duration<double>(delay->get<double>()));
+        return true;
     }
 
     static std::string DnsText(const json& s, const char* field) {

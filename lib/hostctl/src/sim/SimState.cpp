@@ -115,7 +115,9 @@ bool WriteAll(int fd, const std::string& data) {
 //
 // "faults": {operation: message}: the simulated backend's operation of that
 // name (a Backend method name) fails with the message and changes nothing;
-// "operation word" makes only the calls with that argument fail.
+// "operation word" makes only the calls with that argument fail. "delays":
+// {operation: seconds} (set by velk-simhost slow), named the same way: the
+// operation waits that long before it acts.
 //
 // Services and firewall: "services" holds the local shell ("tarnShell") and
 // SSH ("ssh"), each "running" now and "enabled" (started with the host);
