@@ -85,13 +85,17 @@ std::string MasterOf(const NetnsBed& bed, const std::string& link) {
     return json::parse(r.out).at(0).value("master", "");
 }
 
-// Whether ifupdown's or ifupdown2's commands run below the process `pid`.
+// Whether ifupdown's or ifupdown2's commands run below the process `pid`
+// (ifupdown2's are Python scripts: their names are in the command line).
 bool EngineRunsBelow(pid_t pid) {
     for (pid_t child : E2e::ChildrenOf(pid)) {
-        std::ifstream comm("/proc/" + std::to_string(child) + "/comm");
-        std::string name;
-        std::getline(comm, name);
-        if (name == "ifup" || name == "ifdown" || name == "ifreload" || EngineRunsBelow(child)) return true;
+        std::ifstream in("/proc/" + std::to_string(child) + "/cmdline");
+        std::string arg;
+        while (std::getline(in, arg, '\0')) {
+            const std::string name = arg.substr(arg.rfind('/') + 1);
+            if (name == "ifup" || name == "ifdown" || name == "ifreload") return true;
+        }
+        if (EngineRunsBelow(child)) return true;
     }
     return false;
 }
