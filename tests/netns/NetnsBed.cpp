@@ -6,17 +6,21 @@
 #include <poll.h>
 #include <signal.h>
 #include <sys/prctl.h>
+#include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
+#include <condition_variable>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <map>
+#include <mutex>
 #include <sstream>
 #include <stdexcept>
 #include <thread>
@@ -268,6 +272,47 @@ RunResult RunCommand(const std::vector<std::string>& argv, Duration timeout, con
     return result;
 }
 
+// A datagram socket bound as the host's /dev/log and a thread that keeps
+// every message: a reader that falls behind would block the sender.
+struct NetnsBed::SyslogReader {
+    explicit SyslogReader(const std::string& path) {
+        fd = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+        sockaddr_un address{};
+        address.sun_family = AF_UNIX;
+        if (fd < 0 || path.size() >= sizeof address.sun_path)
+            throw std::runtime_error("cannot make a socket for " + path);
+        std::strcpy(address.sun_path, path.c_str());
+        if (bind(fd, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+            const int err = errno;
+            close(fd);
+            throw std::runtime_error("cannot bind " + path + ": " + std::strerror(err));
+        }
+        reader = std::thread([this] {
+            char buffer[8192];
+            while (!stop) {
+                pollfd p{fd, POLLIN, 0};
+                if (poll(&p, 1, 50) <= 0) continue;
+                const ssize_t n = recv(fd, buffer, sizeof buffer, MSG_DONTWAIT);
+                if (n <= 0) continue;
+                std::lock_guard<std::mutex> lock(mutex);
+                lines.emplace_back(buffer, static_cast<size_t>(n));
+                arrived.notify_all();
+            }
+        });
+    }
+    ~SyslogReader() {
+        stop = true;
+        reader.join();
+        close(fd);
+    }
+    int fd = -1;
+    std::atomic<bool> stop{false};
+    std::thread reader;
+    mutable std::mutex mutex;
+    mutable std::condition_variable arrived;
+    std::vector<std::string> lines;
+};
+
 // --- building and tearing down ---
 
 NetnsBed::NetnsBed(BedOptions options) : _options(std::move(options)) {
@@ -362,6 +407,7 @@ void NetnsBed::Build() {
                  fs::copy_options::recursive | fs::copy_options::overwrite_existing);
     }
     StartAnchor();
+    if (_options.syslog) _syslog = std::make_unique<SyslogReader>(HostView("/dev/log"));
     if (_options.writeHostFiles) WriteHostFiles();
 }
 
@@ -371,6 +417,18 @@ void NetnsBed::StartAnchor() {
             throw std::runtime_error("the folder " + path + " cannot be named in an overlay mount");
     const std::string& t = _dir;
     std::string script = "set -e\n";
+    if (_options.syslog) {
+        // An overlay on /dev takes the socket; the terminals and shared
+        // memory mounted below /dev move onto it.
+        fs::create_directories(t + "/dev");
+        fs::create_directories(t + "/work/dev");
+        fs::create_directories(t + "/keep/pts");
+        fs::create_directories(t + "/keep/shm");
+        script += "mount --bind /dev/pts " + t + "/keep/pts\nmount --bind /dev/shm " + t + "/keep/shm\n";
+        script += "mount -t overlay velk-dev -o lowerdir=/dev,upperdir=" + t + "/dev,workdir=" + t +
+                  "/work/dev /dev\n";
+        script += "mount --move " + t + "/keep/pts /dev/pts\nmount --move " + t + "/keep/shm /dev/shm\n";
+    }
     script +=
         "mount -t overlay velk-etc -o lowerdir=/etc,upperdir=" + t + "/etc,workdir=" + t + "/work/etc /etc\n";
     script += "mount -t overlay velk-var-lib -o lowerdir=" +
@@ -477,6 +535,7 @@ std::string NetnsBed::LanServerLog() const { return ReadWhole(_dir + "/lan/dnsma
 void NetnsBed::Teardown() {
     std::vector<std::string> problems;
     StopLanServer();
+    _syslog.reset();
     // Every process in the two namespaces was started by this test (the
     // anchor, DHCP clients, programs under test): end them by their ids, or
     // the mount namespace and its overlays would outlive the test.
@@ -649,6 +708,25 @@ void NetnsBed::SetPassword(const std::string& user, const std::string& password)
         }
     if (!replaced) shadow.push_back(entry);
     WriteFile("/etc/shadow", joined(shadow), 0640);
+}
+
+// --- the host's syslog ---
+
+std::vector<std::string> NetnsBed::SyslogLines() const {
+    if (!_syslog) return {};
+    std::lock_guard<std::mutex> lock(_syslog->mutex);
+    return _syslog->lines;
+}
+
+bool NetnsBed::WaitForSyslog(const std::string& text, Duration timeout, size_t from) const {
+    if (!_syslog) return false;
+    std::unique_lock<std::mutex> lock(_syslog->mutex);
+    size_t seen = from;
+    return _syslog->arrived.wait_for(lock, timeout, [&] {
+        for (; seen < _syslog->lines.size(); ++seen)
+            if (_syslog->lines[seen].find(text) != std::string::npos) return true;
+        return false;
+    });
 }
 
 // --- the kernel ---

@@ -14,6 +14,7 @@
 #include <sys/types.h>
 
 #include <chrono>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -65,6 +66,10 @@ struct BedOptions {
     // instead of the machine's ifupdown. When it cannot be fetched the bed is
     // skipped with the reason.
     bool ifupdown2 = false;
+    // The host's own /dev/log (an overlay on /dev inside the host's mount
+    // namespace), read by the bed: programs' syslog lines, for tests that
+    // follow a program's steps.
+    bool syslog = false;
 };
 
 class NetnsBed {
@@ -121,6 +126,13 @@ public:
     // dnsmasq's log (DHCP and RA exchanges).
     std::string LanServerLog() const;
 
+    // --- the host's syslog (BedOptions::syslog) ---
+    // Every message received so far, in order ("<14>Nov 24 ... VELK: text").
+    std::vector<std::string> SyslogLines() const;
+    // Waits until a message from the `from`th on contains `text`; false
+    // after `timeout`.
+    bool WaitForSyslog(const std::string& text, Duration timeout = kCommandTimeout, size_t from = 0) const;
+
     // Whether the kernel can make the link kind ("vlan", "bond"): tries one
     // in a scratch namespace. "" when it can, else the reason to skip.
     static std::string KernelLacks(const std::string& kind);
@@ -145,6 +157,8 @@ private:
     pid_t _anchor = -1;
     pid_t _dnsmasq = -1;
     Guard _before;
+    struct SyslogReader;
+    std::unique_ptr<SyslogReader> _syslog;
 };
 
 }  // namespace Netns

@@ -664,6 +664,8 @@ public:
         if (!_pending) return;
         PendingChange change = std::move(*_pending);
         _pending.reset();
+        if (change.uplinks && change.uplinks->empty())
+            throw HostCtlException("the management switch of " + change.iface + " needs an uplink");
         ApplyChange(change);
     }
 
@@ -1061,10 +1063,15 @@ private:
         edit(team);
         std::vector<std::string> all = team.activeUplinks;
         all.insert(all.end(), team.standbyUplinks.begin(), team.standbyUplinks.end());
-        if (all.empty()) throw HostCtlException("the management switch " + vswitch + " needs an uplink");
+        // Inside a change set the team may be empty for a moment (the only
+        // uplink replaced: the old one goes before the new one comes); the
+        // change as a whole still needs one.
+        if (all.empty() && !_pending)
+            throw HostCtlException("the management switch " + vswitch + " needs an uplink");
         Stage("", [&](PendingChange& c) {
             c.uplinks = all;
-            c.primary = team.activeUplinks.empty() ? all.front() : team.activeUplinks.front();
+            if (!all.empty())
+                c.primary = team.activeUplinks.empty() ? all.front() : team.activeUplinks.front();
         });
     }
 

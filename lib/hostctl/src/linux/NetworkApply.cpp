@@ -14,6 +14,7 @@
 #include <exception>
 #include <filesystem>
 #include <nlohmann/json.hpp>
+#include <sstream>
 #include <thread>
 
 #include "HostShell.hpp"
@@ -314,6 +315,27 @@ void EditForChange(InterfacesFiles& files, const PendingChange& change, Engine e
 
 namespace {
 
+// The ports the files give the bridge `iface` (none when it is no bridge).
+std::vector<std::string> BridgePorts(const InterfacesFiles& files, const std::string& iface) {
+    std::vector<std::string> ports;
+    for (const auto& place : files.FindIface(iface))
+        if (auto option = files.Files()[place.file].file.Option(place.stanza, "bridge-ports")) {
+            std::istringstream words(*option);
+            for (std::string port; words >> port;)
+                if (port != "none") ports.push_back(port);
+        }
+    return ports;
+}
+
+// ifdown without its hook scripts leaves a bridge's ports in place (VM ports
+// must stay): a NIC the files no longer name is taken off by hand.
+void ReleasePorts(const std::vector<std::string>& before, const std::vector<std::string>& after,
+                  const std::string& what) {
+    for (const std::string& nic : before)
+        if (std::find(after.begin(), after.end(), nic) == after.end())
+            Run({"/sbin/ip", "link", "set", "dev", nic, "nomaster"}, what);
+}
+
 // The files as they were: the very first ones once, the last ones each time
 // (a revert puts these back).
 void KeepFiles(const InterfacesFiles& files) {
@@ -341,6 +363,7 @@ void ApplyChange(const PendingChange& change) {
     if (change.Empty()) return;
     const Engine engine = DetectEngine();
     InterfacesFiles files;
+    const std::vector<std::string> portsBefore = BridgePorts(files, change.iface);
     EditForChange(files, change, engine);
     const std::vector<InterfacesFiles::Change> changes = files.Changes();
     KeepFiles(files);
@@ -357,10 +380,12 @@ void ApplyChange(const PendingChange& change) {
         Run({"/sbin/ifdown", "--no-scripts", "--force", change.iface}, what, left());
     }
     for (const auto& c : changes) ReplaceFile(HostPath(c.path), c.text, c.mode);
-    if (engine == Engine::Ifupdown)
+    if (engine == Engine::Ifupdown) {
         Run({"/sbin/ifup", change.iface}, what, left());
-    else
+        ReleasePorts(portsBefore, BridgePorts(InterfacesFiles(), change.iface), what);
+    } else {
         Run({"/sbin/ifreload", "-a"}, what, left());
+    }
     if (engine == Engine::Ifupdown2 && change.ip && change.ip->GetUseIpv6RouterAdvertised())
         EnableRouterAdvertisements(change.iface);
 
@@ -513,10 +538,12 @@ void PutBackFiles(const std::string& saved, const std::string& iface,
     if (engine == Engine::Ifupdown) {
         // Down with the files in force (they know what is up), without the
         // hook scripts: the bridge and its VM ports stay.
+        const std::vector<std::string> portsBefore = BridgePorts(InterfacesFiles(), iface);
         Run({"/sbin/ifdown", "--no-scripts", "--force", iface}, what, left());
         write(false);
         besides();
         Run({"/sbin/ifup", iface}, what, left());
+        ReleasePorts(portsBefore, BridgePorts(InterfacesFiles(), iface), what);
     } else {
         // ifreload takes VM ports off a bridge its file does not condone
         // them on: it reads the saved files with them condoned, and the

@@ -38,9 +38,9 @@ using std::chrono::milliseconds;
 using Outcome = NetworkCheck::Outcome;
 
 // How long each check may take.
-constexpr milliseconds PROBE_INTERVAL{1000};  // between two ARP probes
+constexpr milliseconds PROBE_INTERVAL{500};  // between two ARP probes (a LAN answers within ms)
 constexpr int PROBES = 3;
-constexpr milliseconds PROBE_WAIT{2500};      // the last probe's answer included
+constexpr milliseconds PROBE_WAIT{1500};      // the last probe's answer included
 constexpr milliseconds CARRIER_WAIT{2000};    // a NIC just brought up negotiates its link
 constexpr milliseconds DAD_WAIT{5000};        // IPv6 duplicate detection takes about 1 s
 constexpr milliseconds NEIGHBOUR_WAIT{4000};  // the kernel gives up after 3 probes, 1 s apart

@@ -23,7 +23,7 @@ std::string CanonicalAddress(const std::string& address);
 // Asks the link of `iface` whether any machine uses the IPv4 `address`: ARP
 // probes with the sender address 0.0.0.0, which no machine's cache takes
 // in. Returns the MAC of the machine that answered, or nothing after about
-// 2.5 s without an answer. Throws HostCtlException when the interface
+// 1.5 s without an answer. Throws HostCtlException when the interface
 // cannot send.
 std::optional<std::string> ProbeIpv4(const std::string& iface, const std::string& address);
 
