@@ -352,7 +352,7 @@ const BadCase kBadCases[] = {
     {.name = "DhcpWithoutServer",
      .edits = {{kIpv4, {"Down", " "}}},
      .ending = BadCase::kCountdown,
-     .shown = "Failed",
+     .shown = "IPv4 address from DHCP",
      .breakLan = [](NetnsBed& bed) { bed.StopLanServer(); }},
     // The dialog keeps one adapter at least: the only one is replaced by a
     // NIC without a cable.

@@ -39,6 +39,9 @@ struct Saved {
     std::string description;
     std::string user;
     std::string time;
+    // The management interface when the change began: a change that takes
+    // its address away also takes away what finds it again.
+    std::string iface;
 };
 
 std::string MarkerPath() { return HostCtl::Lib::HostPath(TRIAL_FILE); }
@@ -101,6 +104,8 @@ std::optional<Saved> Load() {
         if (!field("config", saved.config) || !field("description", saved.description) ||
             !field("user", saved.user) || !field("time", saved.time) || saved.config.empty())
             problem = "is not a saved network configuration";
+        else if (marker.contains("iface") && marker["iface"].is_string())
+            saved.iface = marker["iface"].get<std::string>();
     }
     if (problem.empty()) return saved;
     const std::string aside = path + ".unreadable";
@@ -174,7 +179,8 @@ void NetworkTrialImpl::Save(const std::string& user) {
         json marker = {{"config", GetBackend().GetNetworkConfig()},
                        {"description", Describe()},
                        {"user", user},
-                       {"time", HostCtl::Lib::UtcTimestamp()}};
+                       {"time", HostCtl::Lib::UtcTimestamp()},
+                       {"iface", GetBackend().GetManagementInterfaceName()}};
         HostCtl::Lib::ReplaceFile(MarkerPath(), marker.dump(2) + "\n", 0600);
     });
 }
@@ -182,7 +188,10 @@ void NetworkTrialImpl::Save(const std::string& user) {
 bool NetworkTrialImpl::IsPending() { return ReadSaved().has_value(); }
 
 std::vector<NetworkCheck> NetworkTrialImpl::Check() {
-    const std::string vnic = GetBackend().GetManagementInterfaceName();
+    std::string vnic = GetBackend().GetManagementInterfaceName();
+    if (vnic.empty()) {
+        if (const std::optional<Saved> saved = ReadSaved()) vnic = saved->iface;
+    }
     if (vnic.empty()) return {{"management interface", NetworkCheck::Outcome::Failed, "none"}};
     return GetBackend().CheckNetwork(vnic);
 }
