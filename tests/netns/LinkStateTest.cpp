@@ -21,6 +21,7 @@
 using Netns::BedOptions;
 using Netns::Duration;
 using Netns::NetnsBed;
+using Netns::WaitUntil;
 using nlohmann::json;
 
 namespace {
@@ -58,16 +59,6 @@ bool HasFlag(const json& ipLink, const std::string& flag) {
     for (const json& f : ipLink.value("flags", json::array()))
         if (f == flag) return true;
     return false;
-}
-
-// Polls until `done` holds or `timeout` passes; whether it held.
-bool WaitUntil(const std::function<bool()>& done, Duration timeout) {
-    const auto deadline = std::chrono::steady_clock::now() + timeout;
-    while (!done()) {
-        if (std::chrono::steady_clock::now() >= deadline) return false;
-        std::this_thread::sleep_for(Duration(200));
-    }
-    return true;
 }
 
 bool NoTentativeAddress(const NetnsBed& bed, const std::string& which = "") {

@@ -15,6 +15,7 @@
 using Netns::BedOptions;
 using Netns::Duration;
 using Netns::NetnsBed;
+using Netns::WaitUntil;
 using nlohmann::json;
 
 namespace {
@@ -79,15 +80,6 @@ std::string Placement(const NetnsBed& bed) {
             "\n";
     }
     return text;
-}
-
-bool WaitUntil(const std::function<bool()>& done, Duration timeout) {
-    const auto deadline = std::chrono::steady_clock::now() + timeout;
-    while (!done()) {
-        if (std::chrono::steady_clock::now() >= deadline) return false;
-        std::this_thread::sleep_for(Duration(200));
-    }
-    return true;
 }
 
 struct Row {

@@ -756,4 +756,13 @@ std::string NetnsBed::KernelLacks(const std::string& kind) {
     return reason;
 }
 
+bool WaitUntil(const std::function<bool()>& done, Duration timeout) {
+    const auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (!done()) {
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        std::this_thread::sleep_for(Duration(200));
+    }
+    return true;
+}
+
 }  // namespace Netns

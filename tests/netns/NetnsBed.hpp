@@ -14,6 +14,7 @@
 #include <sys/types.h>
 
 #include <chrono>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -160,5 +161,9 @@ private:
     struct SyslogReader;
     std::unique_ptr<SyslogReader> _syslog;
 };
+
+// Polls `done` every 200 ms until it holds or `timeout` passes; whether it
+// held.
+bool WaitUntil(const std::function<bool()>& done, Duration timeout);
 
 }  // namespace Netns

@@ -2,6 +2,7 @@
 #include "hostctl/Host.hpp"
 
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -9,6 +10,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <ctime>
 #include <deque>
 #include <filesystem>
@@ -244,6 +246,27 @@ void Syslog(int priority, const char* format, ...) {
     va_start(args, format);
     VSyslog(priority, format, args);
     va_end(args);
+}
+
+void WithFolderLock(const std::string& folder, const std::function<void(int folderFd)>& body) {
+    std::error_code ec;
+    std::filesystem::create_directories(folder, ec);
+    if (ec) throw HostCtlException(folder + ": cannot create: " + ec.message());
+    const int fd = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    if (fd < 0) throw HostCtlException(folder + ": cannot open: " + std::strerror(errno));
+    while (flock(fd, LOCK_EX) < 0) {
+        if (errno == EINTR) continue;
+        const int err = errno;
+        close(fd);
+        throw HostCtlException(folder + ": cannot lock: " + std::strerror(err));
+    }
+    try {
+        body(fd);
+    } catch (...) {
+        close(fd);  // releases the lock
+        throw;
+    }
+    close(fd);
 }
 
 void ReplaceFile(const std::string& path, const std::string& text, mode_t mode) {

@@ -52,30 +52,12 @@ std::string FolderOf(const std::string& path) { return path.substr(0, path.rfind
 // other consoles of the host; `body` gets the folder's descriptor, to flush it.
 template <typename Body>
 auto Locked(Body body) -> decltype(body(0)) {
-    const std::string folder = FolderOf(MarkerPath());
-    std::error_code ec;
-    std::filesystem::create_directories(folder, ec);
-    if (ec) throw HostCtlException(folder + ": cannot create: " + ec.message());
-    const int fd = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (fd < 0) throw HostCtlException(folder + ": cannot open: " + std::strerror(errno));
-    while (flock(fd, LOCK_EX) < 0) {
-        if (errno == EINTR) continue;
-        const int err = errno;
-        close(fd);
-        throw HostCtlException(folder + ": cannot lock: " + std::strerror(err));
-    }
-    try {
-        if constexpr (std::is_void_v<decltype(body(fd))>) {
-            body(fd);
-            close(fd);
-        } else {
-            auto result = body(fd);
-            close(fd);
-            return result;
-        }
-    } catch (...) {
-        close(fd);  // releases the lock
-        throw;
+    if constexpr (std::is_void_v<decltype(body(0))>) {
+        HostCtl::Lib::WithFolderLock(FolderOf(MarkerPath()), body);
+    } else {
+        std::optional<decltype(body(0))> result;
+        HostCtl::Lib::WithFolderLock(FolderOf(MarkerPath()), [&](int fd) { result.emplace(body(fd)); });
+        return std::move(*result);
     }
 }
 

@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <cstdarg>
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -57,6 +58,13 @@ void VSyslog(int priority, const char* format, va_list args);
 // old file is still there. A file that is a mount point of its own is
 // rewritten in place instead. Throws HostCtlException naming the file.
 void ReplaceFile(const std::string& path, const std::string& text, mode_t mode);
+
+// Runs `body` with `folder` (made when missing) locked against the other
+// processes that change files in it; `body` gets the folder's descriptor, to
+// flush the folder after a removal. Throws HostCtlException when the folder
+// cannot be made, opened or locked; what `body` throws goes through, the
+// lock released.
+void WithFolderLock(const std::string& folder, const std::function<void(int folderFd)>& body);
 
 // The time now as "2026-11-23T08:15:02.345Z" (UTC, milliseconds), the stamp
 // of the simulated host's log lines.

@@ -226,25 +226,7 @@ const std::map<std::string, Setter>& Keys() {
 // writers, making the folder first when it is missing.
 template <typename Body>
 void WithOptionLock(const std::string& file, Body body) {
-    const std::string folder = file.substr(0, file.rfind('/'));
-    std::error_code ec;
-    std::filesystem::create_directories(folder, ec);
-    if (ec) throw HostCtlException(folder + ": cannot create: " + ec.message());
-    const int fd = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (fd < 0) throw HostCtlException(folder + ": cannot open: " + std::strerror(errno));
-    while (flock(fd, LOCK_EX) < 0) {
-        if (errno == EINTR) continue;
-        const int err = errno;
-        close(fd);
-        throw HostCtlException(folder + ": cannot lock: " + std::strerror(err));
-    }
-    try {
-        body();
-    } catch (...) {
-        close(fd);  // releases the lock
-        throw;
-    }
-    close(fd);
+    WithFolderLock(file.substr(0, file.rfind('/')), [&](int) { body(); });
 }
 
 std::string KindName(bool isInteger) { return isInteger ? "an integer" : "text"; }

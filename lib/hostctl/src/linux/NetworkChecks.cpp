@@ -26,6 +26,7 @@
 #include <thread>
 
 #include "LinkState.hpp"
+#include "UniqueFd.hpp"
 #include "hostctl/Host.hpp"
 #include "hostctl/HostCtl.hpp"
 
@@ -47,19 +48,7 @@ constexpr milliseconds NEIGHBOUR_WAIT{4000};  // the kernel gives up after 3 pro
 constexpr milliseconds DNS_TRY{1000};
 constexpr int DNS_TRIES = 2;
 
-class Fd {
-public:
-    explicit Fd(int fd) : _fd(fd) {}
-    ~Fd() {
-        if (_fd >= 0) close(_fd);
-    }
-    Fd(const Fd&) = delete;
-    Fd& operator=(const Fd&) = delete;
-    int Get() const { return _fd; }
-
-private:
-    int _fd;
-};
+using Fd = UniqueFd;
 
 std::string Errno(int err) { return std::strerror(err); }
 

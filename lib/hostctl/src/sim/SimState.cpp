@@ -11,6 +11,7 @@
 #include <climits>
 #include <system_error>
 
+#include "UniqueFd.hpp"
 #include "hostctl/Host.hpp"
 #include "hostctl/SimNetwork.hpp"
 
@@ -22,25 +23,7 @@ namespace {
 
 std::string ErrnoText(int err) { return std::error_code(err, std::generic_category()).message(); }
 
-// Closes a descriptor when the scope ends.
-class Fd {
-public:
-    explicit Fd(int fd) : _fd(fd) {}
-    ~Fd() {
-        if (_fd >= 0) close(_fd);
-    }
-    Fd(const Fd&) = delete;
-    Fd& operator=(const Fd&) = delete;
-    int get() const { return _fd; }
-    int release() {
-        int fd = _fd;
-        _fd = -1;
-        return fd;
-    }
-
-private:
-    int _fd;
-};
+using Fd = UniqueFd;
 
 bool Later(const timespec& a, const timespec& b) {
     return a.tv_sec > b.tv_sec || (a.tv_sec == b.tv_sec && a.tv_nsec > b.tv_nsec);
@@ -242,7 +225,7 @@ HostCtlException SimState::Error(const std::string& problem) const {
 
 json SimState::Load(Identity& identity, bool mustExist) const {
     Fd fd(open(_statePath.c_str(), O_RDONLY | O_CLOEXEC));
-    if (fd.get() < 0) {
+    if (fd.Get() < 0) {
         int err = errno;
         if (err == ENOENT && !mustExist) {
             identity = {};
@@ -251,7 +234,7 @@ json SimState::Load(Identity& identity, bool mustExist) const {
         throw Error("cannot open: " + ErrnoText(err));
     }
     struct stat st;
-    if (fstat(fd.get(), &st) < 0) throw Error("cannot read: " + ErrnoText(errno));
+    if (fstat(fd.Get(), &st) < 0) throw Error("cannot read: " + ErrnoText(errno));
     identity = {st.st_dev, st.st_ino, st.st_size, st.st_mtim};
 
     // Read straight into the text: a big buffer on the stack would leave the
@@ -260,7 +243,7 @@ json SimState::Load(Identity& identity, bool mustExist) const {
     size_t used = 0;
     for (;;) {
         if (used == text.size()) text.resize(text.size() * 2);
-        ssize_t n = read(fd.get(), text.data() + used, text.size() - used);
+        ssize_t n = read(fd.Get(), text.data() + used, text.size() - used);
         if (n < 0) {
             if (errno == EINTR) continue;
             throw Error("cannot read: " + ErrnoText(errno));
@@ -306,8 +289,8 @@ std::shared_ptr<const json> SimState::Read() {
 void SimState::Update(const std::function<void(json&)>& change,
                       const std::function<void(const json&)>& afterWrite) {
     Fd lockFd(open(LockPath().c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0644));
-    if (lockFd.get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
-    while (flock(lockFd.get(), LOCK_EX) < 0) {
+    if (lockFd.Get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
+    while (flock(lockFd.Get(), LOCK_EX) < 0) {
         if (errno != EINTR) throw HostCtlException(LockPath() + ": cannot lock: " + ErrnoText(errno));
     }
     // Always read the file itself here, never the cache: only what is on disk
@@ -321,8 +304,8 @@ void SimState::Update(const std::function<void(json&)>& change,
 
 void SimState::WithLock(const std::function<void()>& work) {
     Fd lockFd(open(LockPath().c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0644));
-    if (lockFd.get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
-    while (flock(lockFd.get(), LOCK_EX) < 0) {
+    if (lockFd.Get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
+    while (flock(lockFd.Get(), LOCK_EX) < 0) {
         if (errno != EINTR) throw HostCtlException(LockPath() + ": cannot lock: " + ErrnoText(errno));
     }
     work();
@@ -330,8 +313,8 @@ void SimState::WithLock(const std::function<void()>& work) {
 
 void SimState::Replace(const json& state) {
     Fd lockFd(open(LockPath().c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0644));
-    if (lockFd.get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
-    while (flock(lockFd.get(), LOCK_EX) < 0) {
+    if (lockFd.Get() < 0) throw HostCtlException(LockPath() + ": cannot open: " + ErrnoText(errno));
+    while (flock(lockFd.Get(), LOCK_EX) < 0) {
         if (errno != EINTR) throw HostCtlException(LockPath() + ": cannot lock: " + ErrnoText(errno));
     }
     WriteLocked(state);
@@ -346,14 +329,14 @@ void SimState::WriteLocked(const json& state) {
 
     std::string tmpPath = _statePath + ".XXXXXX";
     Fd fd(mkostemp(tmpPath.data(), O_CLOEXEC));
-    if (fd.get() < 0) throw Error("cannot create a temporary file: " + ErrnoText(errno));
+    if (fd.Get() < 0) throw Error("cannot create a temporary file: " + ErrnoText(errno));
     auto fail = [&](const std::string& what) {
         int err = errno;
         unlink(tmpPath.c_str());
         return Error(what + ": " + ErrnoText(err));
     };
-    if (!WriteAll(fd.get(), text)) throw fail("cannot write");
-    if (fchmod(fd.get(), 0644) < 0) throw fail("cannot set mode");
+    if (!WriteAll(fd.Get(), text)) throw fail("cannot write");
+    if (fchmod(fd.Get(), 0644) < 0) throw fail("cannot set mode");
 
     // The new file's modification time must be later than the old file's, even
     // when both writes fall in the same clock tick: readers tell states apart
@@ -370,16 +353,16 @@ void SimState::WriteLocked(const json& state) {
             ++times[1].tv_sec;
         }
     }
-    if (futimens(fd.get(), times) < 0) throw fail("cannot set the modification time");
-    if (fsync(fd.get()) < 0) throw fail("cannot flush");
+    if (futimens(fd.Get(), times) < 0) throw fail("cannot set the modification time");
+    if (fsync(fd.Get()) < 0) throw fail("cannot flush");
     struct stat st;
-    if (fstat(fd.get(), &st) < 0) throw fail("cannot read back");
-    if (close(fd.release()) < 0) throw fail("cannot close");
+    if (fstat(fd.Get(), &st) < 0) throw fail("cannot read back");
+    if (close(fd.Release()) < 0) throw fail("cannot close");
     if (rename(tmpPath.c_str(), _statePath.c_str()) < 0) throw fail("cannot replace");
 
     // Make the rename itself durable.
     Fd dir(open(_root.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (dir.get() >= 0) fsync(dir.get());
+    if (dir.Get() >= 0) fsync(dir.Get());
 
     std::lock_guard<std::mutex> lock(_mutex);
     _cached = std::make_shared<const json>(state);
