@@ -276,7 +276,10 @@ constexpr double kMaxBytesPerCell[] = {1.2 * 0.88,   // console / minimal, linux
                                        1.2 * 1.01};  // vt220
 constexpr double kMaxBurst = 1.2 * 1.0;              // 9 keys at once / one key, every menu and type
 constexpr double kMaxPaste = 1.2 * 1.0;              // paste / (key + 1 per character)
-constexpr double kMaxPeakMemory = 1.2 * 1.54;        // console / minimal
+// Memory: the console with the network checks and the changes on trial in
+// it measured 1.75-1.87 times the minimal program (both figures move by
+// about 150 KiB from run to run).
+constexpr double kMaxPeakMemory = 1.2 * 1.8;  // console / minimal
 
 // With --check, the figures are also judged: the console must reach its
 // menus, stay below the ratios above, and not wake up while idle.
