@@ -127,19 +127,13 @@ void NetworkTrial::Keep(const char* what) {
 }
 
 std::string NetworkTrial::PutBack() {
-    Close();
-    Syslog(LOG_INFO, "Putting back the previous network configuration");
-    try {
-        _trial.Revert();
-    } catch (const HostCtlException& e) {
+    if (const std::optional<std::string> error = Revert("reverted")) {
         // The marker stays for the next start; meanwhile the factory settings
         // are the way back onto the network.
-        Syslog(LOG_ERR, "Putting back the previous network configuration failed: %s", e.what());
-        MessageDialog(_screen, 18, std::string(_factory->GetString(300)) + "\n\n" + e.what()).Execute();
+        MessageDialog(_screen, 18, std::string(_factory->GetString(300)) + "\n\n" + *error).Execute();
         RestoreNetworkDialog(_screen).Execute();
         return "";
     }
-    Audit(_who, "reverted", _before, DescribeNow(_trial));
     const std::vector<NetworkCheck> checks = LoggedChecks(_trial);
     if (NetworkTrialImpl::Passed(checks)) return _factory->GetString(294);
     NetworkCheckWindow window(_screen, NetworkCheckWindow::REVERTED, checks);
@@ -148,15 +142,20 @@ std::string NetworkTrial::PutBack() {
 }
 
 void NetworkTrial::PutBackQuietly(const char* what) {
-    if (!_open) return;
+    if (_open) Revert(what);
+}
+
+std::optional<std::string> NetworkTrial::Revert(const char* what) {
     Close();
     Syslog(LOG_INFO, "Putting back the previous network configuration");
     try {
         _trial.Revert();
-        Audit(_who, what, _before, DescribeNow(_trial));
     } catch (const HostCtlException& e) {
         Syslog(LOG_ERR, "Putting back the previous network configuration failed: %s", e.what());
+        return std::string(e.what());
     }
+    Audit(_who, what, _before, DescribeNow(_trial));
+    return std::nullopt;
 }
 
 void NetworkTrial::Close() {

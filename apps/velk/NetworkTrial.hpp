@@ -10,6 +10,7 @@
 // and one observation event: who, what, before and after.
 #pragma once
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -55,6 +56,8 @@ private:
     std::string PutBack();
     // Puts it back without a screen (the console is ending).
     void PutBackQuietly(const char* what);
+    // Puts it back and audits that as `what`; why it failed, if it did.
+    std::optional<std::string> Revert(const char* what);
     void Close();
 
     static std::vector<QelCtl::Network::NetworkCheck> LoggedChecks(QelCtl::Network::NetworkTrialImpl& trial);

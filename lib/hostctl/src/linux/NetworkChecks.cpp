@@ -219,26 +219,33 @@ std::vector<NetworkCheck> CheckAddresses(const std::string& iface, const std::ve
                                          bool dhcp4) {
     std::vector<std::string> want;
     for (const std::string& w : wanted) want.push_back(CanonicalAddress(w));
-    // Waits while an address is missing or still in duplicate detection (a
-    // failed detection leaves the address tentative for good).
+    // Waits while a configured address or the lease is missing or still in
+    // duplicate detection (a failed detection leaves the address tentative
+    // for good). The addresses the kernel makes itself (link-local, from
+    // router advertisements) are not waited for: an apply that takes the
+    // link down starts their detection again, and they are only judged when
+    // it has already failed.
     NetworkSnapshot net;
     const LinkInfo* link = nullptr;
     const auto deadline = Clock::now() + DAD_WAIT;
+    auto pending = [](const AddressInfo* a) { return a->Tentative() && !a->DadFailed(); };
     while (true) {
         net = ReadNetwork();
         link = net.FindLink(iface);
         if (link == nullptr) return {Failed("interface " + iface, "missing")};
         const std::vector<const AddressInfo*> have = net.AddressesOf(link->index);
-        bool waiting = std::any_of(have.begin(), have.end(),
-                                   [](const AddressInfo* a) { return a->Tentative() && !a->DadFailed(); });
-        for (const std::string& w : want)
-            waiting |=
-                std::none_of(have.begin(), have.end(), [&](const AddressInfo* a) { return a->address == w; });
+        bool waiting = false;
+        for (const std::string& w : want) {
+            auto found =
+                std::find_if(have.begin(), have.end(), [&](const AddressInfo* a) { return a->address == w; });
+            waiting |= found == have.end() || pending(*found);
+        }
         if (dhcp4)
-            waiting |= std::none_of(have.begin(), have.end(),
-                                    [](const AddressInfo* a) { return !a->ipv6 && !a->Permanent(); });
+            waiting |= std::none_of(have.begin(), have.end(), [&](const AddressInfo* a) {
+                return !a->ipv6 && !a->Permanent() && !pending(a);
+            });
         if (!waiting || Clock::now() >= deadline) break;
-        std::this_thread::sleep_for(milliseconds(100));
+        std::this_thread::sleep_for(milliseconds(50));
     }
 
     const std::vector<const AddressInfo*> have = net.AddressesOf(link->index);
@@ -270,12 +277,13 @@ std::vector<NetworkCheck> CheckAddresses(const std::string& iface, const std::ve
             judged.push_back(*lease);
         }
     }
-    // Addresses from router advertisements or DHCPv6, and the link-local one
-    // when its duplicate detection failed (the gateways' answers need it).
+    // Addresses from router advertisements or DHCPv6 once their detection
+    // ended, and the link-local one when its detection failed (the gateways'
+    // answers need it).
     for (const AddressInfo* a : have) {
         if (std::find(judged.begin(), judged.end(), a) != judged.end()) continue;
         const bool linkLocal = a->ipv6 && a->address.rfind("fe80:", 0) == 0;
-        if (!a->ipv6 || (linkLocal && !a->DadFailed())) continue;
+        if (!a->ipv6 || pending(a) || (linkLocal && !a->DadFailed())) continue;
         checks.push_back(judge(*a));
     }
     return checks;
@@ -293,6 +301,21 @@ NetworkCheck CheckGateway(const std::string& iface, const std::string& gateway) 
     std::unique_ptr<nl_sock, SocketDeleter> sock(nl_socket_alloc());
     if (!sock || nl_connect(sock.get(), NETLINK_ROUTE) < 0)
         return Failed(subject, "rtnetlink cannot be asked");
+
+    // The kernel asks for an IPv6 neighbour from its link-local address, so
+    // that address's duplicate detection must end first (an apply that took
+    // the link down started it again).
+    if (family == AF_INET6) {
+        const auto deadline = Clock::now() + DAD_WAIT;
+        auto linkLocalReady = [&] {
+            const NetworkSnapshot net = ReadNetwork();
+            const std::vector<const AddressInfo*> have = net.AddressesOf(int(ifindex));
+            return std::any_of(have.begin(), have.end(), [](const AddressInfo* a) {
+                return a->ipv6 && a->address.rfind("fe80:", 0) == 0 && !a->Tentative();
+            });
+        };
+        while (!linkLocalReady() && Clock::now() < deadline) std::this_thread::sleep_for(milliseconds(50));
+    }
 
     // An entry the administrator set stays: the kernel never probes it.
     const int before = NeighbourState(sock.get(), int(ifindex), address.get());

@@ -36,7 +36,8 @@ std::vector<NetworkCheck> CheckLinks(const std::string& iface, const std::vector
 
 // The addresses of `iface` ("address 192.0.2.10"): each of `wanted` must be
 // there, an IPv4 lease too when `dhcp4`, and no address may be a duplicate.
-// Waits (bounded) while IPv6 duplicate detection runs.
+// Waits (bounded) while the duplicate detection of those runs; the
+// addresses the kernel makes itself are judged only once theirs has ended.
 std::vector<NetworkCheck> CheckAddresses(const std::string& iface, const std::vector<std::string>& wanted,
                                          bool dhcp4);
 
