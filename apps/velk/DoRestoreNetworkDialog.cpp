@@ -54,14 +54,11 @@ int DoRestoreNetworkDialog::Run() {
             powerOffFailed = true;
     }
 
-    // The configuration the clear removes, put back when the new one cannot
-    // be made: a failed restore leaves the host as it was, not without network.
-    std::string removed;
-    bool cleared = false;
     bool restored = false;
     // The configuration as it is goes aside first, as for every change of
-    // the management network: restored settings that fail their checks, or
-    // a console that ends before they are decided, get it back.
+    // the management network: a restore that fails halfway, restored
+    // settings that fail their checks, or a console that ends before they
+    // are decided, get it back.
     NetworkTrial trial(this);
     try {
         networkInfo.DisableNetDumper();
@@ -72,10 +69,8 @@ int DoRestoreNetworkDialog::Run() {
             Log(failed);
         } else {
             Log(std::string(_factory->GetString(210)) + " ");
-            removed = networkInfo.GetNetworkConfig();
             Syslog(LOG_INFO, "Clearing Network Config");
             networkInfo.ClearNetworkConfig();
-            cleared = true;
             Syslog(LOG_INFO, "Auto-Configuring Network");
             networkInfo.AutoConfigNetwork();
             Log(done);
@@ -84,14 +79,8 @@ int DoRestoreNetworkDialog::Run() {
     } catch (const HostCtl::Lib::HostCtlException&) {
         Log(failed);
         Syslog(LOG_ERR, "Error auto-configuring network");
-        if (cleared) {
-            Syslog(LOG_INFO, "Putting back the network configuration");
-            try {
-                networkInfo.SetNetworkConfig(removed);
-            } catch (const HostCtl::Lib::HostCtlException& e) {
-                Syslog(LOG_ERR, "Putting back the network configuration failed: %s", e.what());
-            }
-        }
+        // A failed restore leaves the host as it was, not without network.
+        trial.Undo();
     }
 
     if (restored) {

@@ -45,7 +45,7 @@ std::string DescribeNow(NetworkTrialImpl& trial) {
 
 NetworkTrial::NetworkTrial(Frame* screen) : _screen(screen), _factory(StringFactory::Get("en_US")) {}
 
-NetworkTrial::~NetworkTrial() { PutBackQuietly("reverted"); }
+NetworkTrial::~NetworkTrial() { Undo(); }
 
 bool NetworkTrial::AddressFree(Frame* screen, const HostCtl::Network::Ipv4Address& address) {
     StringFactory* factory = StringFactory::Get("en_US");
@@ -68,9 +68,9 @@ bool NetworkTrial::AddressFree(Frame* screen, const HostCtl::Network::Ipv4Addres
 
 bool NetworkTrial::Begin() {
     try {
-        _trial.Save(Frame::_loginName);
-        _who = _trial.SavedBy();
-        _before = _trial.SavedDescription();
+        const QelCtl::Network::PendingChange saved = _trial.Save(Frame::_loginName);
+        _who = saved.user;
+        _before = saved.description;
     } catch (const HostCtlException& e) {
         Syslog(LOG_ERR, "Saving the network configuration failed: %s", e.what());
         MessageDialog(_screen, 18, std::string(_factory->GetString(299)) + "\n\n" + e.what()).Execute();
@@ -78,7 +78,7 @@ bool NetworkTrial::Begin() {
     }
     _open = true;
     Syslog(LOG_INFO, "Saved the network configuration before the change");
-    Frame::_atEnd = [this] { PutBackQuietly("reverted"); };
+    Frame::_atEnd = [this] { Undo(); };
     return true;
 }
 
@@ -88,7 +88,7 @@ std::vector<NetworkCheck> NetworkTrial::LoggedChecks(NetworkTrialImpl& trial) {
     std::vector<NetworkCheck> checks;
     try {
         checks = trial.Check();
-    } catch (const HostCtlException& e) {
+    } catch (const std::exception& e) {
         // Checks that cannot run prove nothing: they count as failed.
         checks.push_back({e.what(), NetworkCheck::Outcome::Failed, ""});
     }
@@ -141,8 +141,8 @@ std::string NetworkTrial::PutBack() {
     return "";
 }
 
-void NetworkTrial::PutBackQuietly(const char* what) {
-    if (_open) Revert(what);
+void NetworkTrial::Undo() {
+    if (_open) Revert("reverted");
 }
 
 std::optional<std::string> NetworkTrial::Revert(const char* what) {
@@ -150,7 +150,7 @@ std::optional<std::string> NetworkTrial::Revert(const char* what) {
     Syslog(LOG_INFO, "Putting back the previous network configuration");
     try {
         _trial.Revert();
-    } catch (const HostCtlException& e) {
+    } catch (const std::exception& e) {
         Syslog(LOG_ERR, "Putting back the previous network configuration failed: %s", e.what());
         return std::string(e.what());
     }
@@ -164,28 +164,26 @@ void NetworkTrial::Close() {
 }
 
 std::string NetworkTrial::RecoverAtStart() {
-    NetworkTrialImpl trial;
-    std::string who;
-    std::string before;
+    NetworkTrial trial(nullptr);
+    std::optional<QelCtl::Network::PendingChange> pending;
     try {
-        if (!trial.IsPending()) return "";
-        who = trial.SavedBy();
-        before = trial.SavedDescription();
+        pending = trial._trial.Pending();
     } catch (const HostCtlException& e) {
         Syslog(LOG_ERR, "Cannot tell whether a network change is unfinished: %s", e.what());
         return "";
     }
-    Syslog(LOG_WARNING, "A network change by %s was left unfinished; putting back the previous configuration",
-           who.c_str());
-    StringFactory* factory = StringFactory::Get("en_US");
-    try {
-        trial.Revert();
-    } catch (const HostCtlException& e) {
-        Syslog(LOG_ERR, "Putting back the previous network configuration failed: %s", e.what());
-        return std::string(factory->GetString(300)) + " " + e.what();
+    if (!pending) return "";
+    if (pending->elsewhere) {
+        Syslog(LOG_INFO, "A network change by %s is on trial at another console", pending->user.c_str());
+        return "";
     }
-    Audit(who, "reverted at start", before, DescribeNow(trial));
-    return factory->GetString(298);
+    Syslog(LOG_WARNING, "A network change by %s was left unfinished; putting back the previous configuration",
+           pending->user.c_str());
+    trial._who = pending->user;
+    trial._before = pending->description;
+    if (const std::optional<std::string> error = trial.Revert("reverted at start"))
+        return std::string(trial._factory->GetString(300)) + " " + *error;
+    return trial._factory->GetString(298);
 }
 
 void NetworkTrial::Audit(const std::string& who, const char* what, const std::string& before,

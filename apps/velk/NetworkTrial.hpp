@@ -22,7 +22,8 @@ namespace Velk {
 
 class NetworkTrial {
 public:
-    // `screen` is the screen the trial's dialogs open over.
+    // `screen` is the screen the trial's dialogs open over (none before the
+    // first screen).
     explicit NetworkTrial(Frame* screen);
     // A change still on trial is put back.
     ~NetworkTrial();
@@ -44,6 +45,9 @@ public:
     // Keeps a change whose checks passed; otherwise the check screen decides.
     // The line for the status row of the menu.
     std::string Decide(const std::vector<QelCtl::Network::NetworkCheck>& checks);
+    // Puts a change still on trial back at once, without a screen (a step
+    // failed, or the console is ending).
+    void Undo();
 
     // Before the welcome screen: puts back a change a console left on trial.
     // The line for the welcome screen, "" when there was none.
@@ -54,8 +58,6 @@ private:
     // Puts the saved configuration back and checks it; the line for the
     // status row.
     std::string PutBack();
-    // Puts it back without a screen (the console is ending).
-    void PutBackQuietly(const char* what);
     // Puts it back and audits that as `what`; why it failed, if it did.
     std::optional<std::string> Revert(const char* what);
     void Close();

@@ -125,7 +125,7 @@ const VmCase kVmCases[] = {
     {"HostRefusesTheRestore", "Enter", "ClearNetworkConfig", "Auto-configuring network. Failed.",
      "user.err: Error auto-configuring network"},
     {"HostRefusesTheNewNetwork", "Enter", "AutoConfigNetwork", "Auto-configuring network. Failed.",
-     "user.info: Putting back the network configuration"},
+     "user.info: Putting back the previous network configuration"},
 };
 INSTANTIATE_TEST_SUITE_P(Cases, RunningVmsTest, ::testing::ValuesIn(kVmCases),
                          [](const auto& info) { return std::string(info.param.name); });

@@ -119,7 +119,19 @@ std::string OneLine(const std::string& message) {
     return out;
 }
 
-std::string Format(const char* format, va_list args) {
+void AppendToHostLog(const std::string& path, const std::string& line) {
+    int fd = open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0644);
+    if (fd < 0) return;  // nowhere to report it: the line still went to syslog
+    // One write: appends of other processes land before or after it, never
+    // inside it.
+    ssize_t ignored = write(fd, line.data(), line.size());
+    (void)ignored;
+    close(fd);
+}
+
+}  // namespace
+
+std::string VFormat(const char* format, va_list args) {
     va_list copy;
     va_copy(copy, args);
     char small[512];
@@ -132,18 +144,6 @@ std::string Format(const char* format, va_list args) {
     text.resize(size_t(n));
     return text;
 }
-
-void AppendToHostLog(const std::string& path, const std::string& line) {
-    int fd = open(path.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0644);
-    if (fd < 0) return;  // nowhere to report it: the line still went to syslog
-    // One write: appends of other processes land before or after it, never
-    // inside it.
-    ssize_t ignored = write(fd, line.data(), line.size());
-    (void)ignored;
-    close(fd);
-}
-
-}  // namespace
 
 void InitHost() {
     HostChoice& c = Choice();
@@ -229,7 +229,7 @@ void VSyslog(int priority, const char* format, va_list args) {
     const int level = priority & LOG_PRIMASK;
 
     errno = savedErrno;  // for "%m"
-    const std::string message = Format(format, args);
+    const std::string message = VFormat(format, args);
     syslog(facility | level, "%s", message.c_str());
 
     if (!logPath.empty()) {

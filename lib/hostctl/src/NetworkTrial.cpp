@@ -16,7 +16,6 @@
 #include <functional>
 #include <nlohmann/json.hpp>
 #include <optional>
-#include <type_traits>
 
 #include "hostctl/Backend.hpp"
 #include "hostctl/Host.hpp"
@@ -50,15 +49,48 @@ std::string FolderOf(const std::string& path) { return path.substr(0, path.rfind
 
 // Runs `body` with the marker's folder (made when missing) locked against the
 // other consoles of the host; `body` gets the folder's descriptor, to flush it.
-template <typename Body>
-auto Locked(Body body) -> decltype(body(0)) {
-    if constexpr (std::is_void_v<decltype(body(0))>) {
-        HostCtl::Lib::WithFolderLock(FolderOf(MarkerPath()), body);
-    } else {
-        std::optional<decltype(body(0))> result;
-        HostCtl::Lib::WithFolderLock(FolderOf(MarkerPath()), [&](int fd) { result.emplace(body(fd)); });
-        return std::move(*result);
+void Locked(const std::function<void(int folderFd)>& body) {
+    HostCtl::Lib::WithFolderLock(FolderOf(MarkerPath()), body);
+}
+
+// The console that has a change on trial holds a shared lock on the marker
+// until it keeps or puts back the change; the kernel drops the lock with the
+// console, so a marker nobody holds was left behind. Opened close-on-exec: a
+// program the console runs (a DHCP client that stays) must not keep it.
+int g_ownerFd = -1;
+
+void Disown() {
+    if (g_ownerFd >= 0) close(g_ownerFd);
+    g_ownerFd = -1;
+}
+
+// Whether this console holds the marker as it is now.
+bool Owned() {
+    struct stat held, now;
+    return g_ownerFd >= 0 && fstat(g_ownerFd, &held) == 0 && stat(MarkerPath().c_str(), &now) == 0 &&
+           held.st_dev == now.st_dev && held.st_ino == now.st_ino;
+}
+
+void Own() {
+    Disown();
+    const std::string path = MarkerPath();
+    const int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd < 0 || flock(fd, LOCK_SH | LOCK_NB) < 0) {
+        const int err = errno;
+        if (fd >= 0) close(fd);
+        throw HostCtlException(path + ": cannot lock: " + std::strerror(err));
     }
+    g_ownerFd = fd;
+}
+
+// Whether another running console holds the marker.
+bool HeldElsewhere() {
+    if (Owned()) return false;
+    const int fd = open(MarkerPath().c_str(), O_RDONLY | O_CLOEXEC);
+    if (fd < 0) return false;
+    const bool held = flock(fd, LOCK_EX | LOCK_NB) < 0 && errno == EWOULDBLOCK;
+    close(fd);
+    return held;
 }
 
 // The saved configuration, or nothing when no change is pending. A marker
@@ -105,7 +137,13 @@ std::optional<Saved> Load() {
 std::optional<Saved> ReadSaved() {
     struct stat st;
     if (stat(MarkerPath().c_str(), &st) < 0 && errno == ENOENT) return std::nullopt;
-    return Locked([](int) { return Load(); });
+    std::optional<Saved> saved;
+    Locked([&](int) { saved = Load(); });
+    return saved;
+}
+
+std::string OnTrialElsewhere(const Saved& saved) {
+    return "a network change by " + saved.user + " is on trial at another console";
 }
 
 // Removes the marker so that a crash right after cannot bring it back.
@@ -152,22 +190,38 @@ std::optional<std::string> NetworkTrialImpl::ProbeAddress(const HostCtl::Network
     return address.GetStringAddress() + " is already used on the management network by " + *who;
 }
 
-void NetworkTrialImpl::Save(const std::string& user) {
+PendingChange NetworkTrialImpl::Save(const std::string& user) {
+    PendingChange saved;
     Locked([&](int) {
         // The configuration of the first change on trial is the one to go
-        // back to; a second one may not replace it.
-        if (const std::optional<Saved> pending = Load())
-            throw HostCtlException("a network change by " + pending->user + " is still on trial");
+        // back to: a change still pending is taken over, not replaced.
+        if (const std::optional<Saved> pending = Load()) {
+            if (HeldElsewhere()) throw HostCtlException(OnTrialElsewhere(*pending));
+            Own();
+            saved = {pending->user, pending->description, false};
+            return;
+        }
+        saved = {user, Describe(), false};
         json marker = {{"config", GetBackend().GetNetworkConfig()},
-                       {"description", Describe()},
+                       {"description", saved.description},
                        {"user", user},
                        {"time", HostCtl::Lib::UtcTimestamp()},
                        {"iface", GetBackend().GetManagementInterfaceName()}};
         HostCtl::Lib::ReplaceFile(MarkerPath(), marker.dump(2) + "\n", 0600);
+        Own();
     });
+    return saved;
 }
 
-bool NetworkTrialImpl::IsPending() { return ReadSaved().has_value(); }
+std::optional<PendingChange> NetworkTrialImpl::Pending() {
+    std::optional<PendingChange> pending;
+    if (!std::filesystem::exists(MarkerPath())) return pending;
+    Locked([&](int) {
+        if (const std::optional<Saved> saved = Load())
+            pending = PendingChange{saved->user, saved->description, HeldElsewhere()};
+    });
+    return pending;
+}
 
 std::vector<NetworkCheck> NetworkTrialImpl::Check() {
     std::string vnic = GetBackend().GetManagementInterfaceName();
@@ -184,15 +238,20 @@ bool NetworkTrialImpl::Passed(const std::vector<NetworkCheck>& checks) {
 }
 
 void NetworkTrialImpl::Keep() {
-    Locked([](int folderFd) { RemoveMarker(folderFd); });
+    Locked([](int folderFd) {
+        RemoveMarker(folderFd);
+        Disown();
+    });
 }
 
 void NetworkTrialImpl::Revert() {
     Locked([](int folderFd) {
         const std::optional<Saved> saved = Load();
         if (!saved) throw HostCtlException("no saved network configuration to put back");
+        if (HeldElsewhere()) throw HostCtlException(OnTrialElsewhere(*saved));
         GetBackend().SetNetworkConfig(saved->config);
         RemoveMarker(folderFd);
+        Disown();
     });
 }
 
@@ -269,16 +328,6 @@ std::string NetworkTrialImpl::Describe() {
     std::string line;
     for (const std::string& part : parts) line += (line.empty() ? "" : ", ") + part;
     return line;
-}
-
-std::string NetworkTrialImpl::SavedDescription() {
-    const std::optional<Saved> saved = ReadSaved();
-    return saved ? saved->description : "";
-}
-
-std::string NetworkTrialImpl::SavedBy() {
-    const std::optional<Saved> saved = ReadSaved();
-    return saved ? saved->user : "";
 }
 
 }  // namespace QelCtl::Network

@@ -34,8 +34,10 @@ int ObzUserLib_Init(void) {
 
 int ObzUserLib_VAddObz(const char* format, va_list args) {
     if (!g_open) return EBADF;
-    char event[1024];
-    vsnprintf(event, sizeof event, format, args);
+    // As long as it is: an audit event names a whole configuration before
+    // and after.
+    const std::string text = HostCtl::Lib::VFormat(format, args);
+    const char* event = text.c_str();
     HostCtl::Lib::Syslog(LOG_INFO, "%s", event);
     if (g_obzLog < 0) return 0;
 

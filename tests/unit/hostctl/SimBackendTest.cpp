@@ -1,5 +1,9 @@
 // The host control operations on a simulated host: what one write leaves for
 // the next read, and the packing of the version record.
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
 #include <chrono>
 #include <cstring>
 #include <filesystem>
@@ -377,33 +381,58 @@ TEST_F(SimBackendTest, NetworkTrialSavesKeepsAndReverts) {
         network.SetQelIpv6Enabled(false);
     };
 
-    EXPECT_FALSE(trial.IsPending());
+    EXPECT_FALSE(trial.Pending());
     EXPECT_THROW(trial.Revert(), HostCtlException);
-    trial.Save("root");
-    EXPECT_TRUE(trial.IsPending());
-    EXPECT_EQ(trial.SavedBy(), "root");
-    EXPECT_EQ(trial.SavedDescription(), description);
-    EXPECT_THROW(trial.Save("admin"), HostCtlException);  // the first saved configuration stays
+    EXPECT_EQ(trial.Save("root").description, description);
+    ASSERT_TRUE(trial.Pending());
+    EXPECT_EQ(trial.Pending()->user, "root");
+    EXPECT_EQ(trial.Pending()->description, description);
+    EXPECT_FALSE(trial.Pending()->elsewhere);
+    EXPECT_EQ(trial.Save("admin").user, "root");  // the first saved configuration stays
     change();
     EXPECT_NE(network.GetNetworkConfig(), before);
     EXPECT_NE(trial.Describe(), description);
     trial.Revert();
     EXPECT_EQ(network.GetNetworkConfig(), before);
     EXPECT_EQ(ReadFile(Root() + "/etc/hosts"), hostsBefore);
-    EXPECT_FALSE(trial.IsPending());
+    EXPECT_FALSE(trial.Pending());
     EXPECT_FALSE(std::filesystem::exists(marker));
 
     trial.Save("root");
     change();
     const std::string changed = network.GetNetworkConfig();
     trial.Keep();
-    EXPECT_FALSE(trial.IsPending());
-    EXPECT_EQ(trial.SavedBy(), "");
+    EXPECT_FALSE(trial.Pending());
     EXPECT_EQ(network.GetNetworkConfig(), changed);
+
+    // Another console's change is its own while that console runs: it is
+    // neither taken over nor put back; once that console is gone, it is.
+    int ready[2];
+    ASSERT_EQ(pipe(ready), 0);
+    const pid_t other = fork();
+    if (other == 0) {
+        QelCtl::Network::NetworkTrialImpl().Save("admin");
+        (void)!write(ready[1], "s", 1);
+        pause();
+        _exit(0);
+    }
+    char byte = 0;
+    ASSERT_EQ(read(ready[0], &byte, 1), 1);
+    close(ready[0]);
+    close(ready[1]);
+    ASSERT_TRUE(trial.Pending());
+    EXPECT_TRUE(trial.Pending()->elsewhere);
+    EXPECT_THROW(trial.Save("root"), HostCtlException);
+    EXPECT_THROW(trial.Revert(), HostCtlException);
+    kill(other, SIGKILL);
+    waitpid(other, nullptr, 0);
+    EXPECT_FALSE(trial.Pending()->elsewhere);
+    trial.Revert();
+    EXPECT_FALSE(trial.Pending());
 
     // Garbage is logged and moved aside, and nothing is put back.
     WriteFile(marker, "{\"config\": \"{\\\"/network/vnics\\\"");
-    EXPECT_FALSE(trial.IsPending());
+    EXPECT_FALSE(trial.Pending());
     EXPECT_TRUE(std::filesystem::exists(marker + ".unreadable"));
     EXPECT_NE(ReadFile(Root() + "/var/log/syslog.log").find(marker + " is not a saved network configuration"),
               std::string::npos);
@@ -415,7 +444,7 @@ TEST_F(SimBackendTest, NetworkTrialSavesKeepsAndReverts) {
                             {"time", "2026-11-24T08:00:00.000Z"}})
                           .dump());
     ExpectRefused([&] { trial.Revert(); });
-    EXPECT_TRUE(trial.IsPending());
+    EXPECT_TRUE(trial.Pending());
     EXPECT_EQ(network.GetNetworkConfig(), changed);
 }
 

@@ -51,6 +51,9 @@ void OpenLog(const char* ident, int option, int facility);
 void Syslog(int priority, const char* format, ...) __attribute__((format(printf, 2, 3)));
 void VSyslog(int priority, const char* format, va_list args);
 
+// The text printf makes of `format` and `args`, however long.
+std::string VFormat(const char* format, va_list args);
+
 // Replaces the file at `path` as a whole with `text` and permissions `mode`:
 // the text goes to a temporary file in the same folder, which is flushed to
 // disk and renamed over `path`, and the folder is flushed too. Readers see

@@ -158,11 +158,21 @@ struct NetworkCheck {
     std::string detail;
 };
 
+// A change of the management network neither kept nor reverted.
+struct PendingChange {
+    std::string user;         // who began it
+    std::string description;  // the network before it (see Describe)
+    // Whether another running console has it on trial (and keeps or puts
+    // it back itself).
+    bool elsewhere = false;
+};
+
 // A change of the management network on trial. Before the change the
 // present configuration is saved with a marker (one file under
 // "/var/lib/velk/", written atomically); after it, the checks tell whether
 // the host is still reachable; the change is then kept (the marker goes) or
-// the saved configuration is put back. A marker found when the console
+// the saved configuration is put back. The console that saved it holds a
+// lock on the marker until then, so a marker nobody holds when a console
 // starts belongs to a console that ended in between: the saved
 // configuration is put back before anything else.
 class NetworkTrialImpl {
@@ -173,11 +183,15 @@ public:
     // itself fails, which tells nothing about the address.
     std::optional<std::string> ProbeAddress(const HostCtl::Network::Ipv4Address& address);
     // Saves the present network configuration (files and running state)
-    // with the marker, `user` recorded as who changes it. Throws
-    // HostCtlException when it cannot be saved; nothing is then changed.
-    void Save(const std::string& user);
-    // Whether a saved change is neither kept nor reverted.
-    bool IsPending();
+    // with the marker, `user` recorded as who changes it, and returns what
+    // was saved. A change still pending that no running console has on trial
+    // (its put-back failed, or its console is gone) stays the way back: it
+    // is taken over and returned instead. Throws HostCtlException when
+    // another console has a change on trial, or when the configuration
+    // cannot be saved; nothing is then changed.
+    PendingChange Save(const std::string& user);
+    // The change neither kept nor reverted, nothing when there is none.
+    std::optional<PendingChange> Pending();
     // The checks of the management interface, in order (see
     // Backend::CheckNetwork); bounded.
     std::vector<NetworkCheck> Check();
@@ -187,15 +201,11 @@ public:
     void Keep();
     // Puts the saved configuration back and applies it, then drops the
     // marker. Throws HostCtlException when it cannot be put back (the marker
-    // then stays).
+    // then stays), or when another console has the change on trial.
     void Revert();
     // The management network in one line for the audit: addresses, VLAN,
     // adapters, name servers, host name.
     std::string Describe();
-    // What Describe said when the configuration was saved, and who saved it
-    // ("" when nothing is pending).
-    std::string SavedDescription();
-    std::string SavedBy();
 };
 
 // Host name, domain, name servers and search domains of one network stack.

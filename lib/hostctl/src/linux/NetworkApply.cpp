@@ -33,12 +33,29 @@ const char* const VM_PORTS = "^(tap|veth|fwpr|vnet)";
 
 // How long the engine and the kernel get. ifup waits about a minute for a
 // lease nobody gives: a change waiting for DHCP ends after DHCP_MS in all,
-// the tool's run included.
+// the tool's run included. A put-back may run while the console ends, which
+// waits PUT_BACK_MS for it: one bound for all of it, whatever the method.
 constexpr int ENGINE_MS = 35000;
 constexpr int STATIC_MS = 10000;
 constexpr int DHCP_MS = 30000;
+constexpr int PUT_BACK_MS = 30000;
 
 using Clock = std::chrono::steady_clock;
+
+// One bound for several steps: each gets what is left of it.
+class Budget {
+public:
+    explicit Budget(int ms) : _ms(ms), _end(Clock::now() + std::chrono::milliseconds(ms)) {}
+    int Left() const {
+        return int(std::chrono::duration_cast<std::chrono::milliseconds>(_end - Clock::now()).count());
+    }
+    bool Over() const { return Clock::now() >= _end; }
+    int Seconds() const { return _ms / 1000; }
+
+private:
+    int _ms;
+    Clock::time_point _end;
+};
 
 bool Exists(const std::string& hostPath) {
     struct stat st {};
@@ -255,11 +272,12 @@ bool Shows(const PendingChange& change, std::string& missing) {
 
 void Run(const std::vector<std::string>& argv, const std::string& what, int boundMs = ENGINE_MS) {
     std::string output;
-    const int status = RunBounded(argv, std::max(1000, boundMs), &output);
+    const int bound = std::max(1000, boundMs);
+    const int status = RunBounded(argv, bound, &output);
     std::string line = argv[0];
     for (size_t i = 1; i < argv.size(); ++i) line += " " + argv[i];
     if (status == -1)
-        Syslog(LOG_WARNING, "%s: %s did not end within %d s", what.c_str(), line.c_str(), boundMs / 1000);
+        Syslog(LOG_WARNING, "%s: %s did not end within %.1f s", what.c_str(), line.c_str(), bound / 1000.0);
     // The tools' status is no proof either way: the kernel's state is.
     else if (status != 0)
         Syslog(LOG_WARNING, "%s: %s ended with status %d: %s", what.c_str(), line.c_str(), status,
@@ -345,14 +363,13 @@ void KeepFiles(const InterfacesFiles& files) {
     }
 }
 
-// Waits until the kernel shows the change, at most until `ms` after `start`.
-void WaitFor(const PendingChange& change, Clock::time_point start, int ms, const std::string& what) {
-    const auto deadline = start + std::chrono::milliseconds(ms);
+// Waits until the kernel shows the change, at most until `budget` is spent.
+void WaitFor(const PendingChange& change, const Budget& budget, const std::string& what) {
     std::string missing;
     while (!Shows(change, missing)) {
-        if (Clock::now() >= deadline)
+        if (budget.Over())
             throw HostCtlException(what + ": " + missing + " did not appear within " +
-                                   std::to_string(ms / 1000) + " s");
+                                   std::to_string(budget.Seconds()) + " s");
         std::this_thread::sleep_for(std::chrono::milliseconds(100));
     }
 }
@@ -369,27 +386,23 @@ void ApplyChange(const PendingChange& change) {
     KeepFiles(files);
     const std::string what = "applying the network configuration of " + change.iface;
     const bool dhcp = change.ip && (change.ip->GetUseDhcp() || change.ip->GetUseIpv6Dhcp());
-    const auto start = Clock::now();
-    const auto left = [&] {
-        const auto spent = std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start);
-        return dhcp ? DHCP_MS - int(spent.count()) : ENGINE_MS;
-    };
+    const Budget budget(dhcp ? DHCP_MS : ENGINE_MS);
     if (engine == Engine::Ifupdown) {
         // Down with the old stanza and without the hook scripts: the bridge,
         // its ifindex and its VM ports stay; only the addresses go.
-        Run({"/sbin/ifdown", "--no-scripts", "--force", change.iface}, what, left());
+        Run({"/sbin/ifdown", "--no-scripts", "--force", change.iface}, what, budget.Left());
     }
     for (const auto& c : changes) ReplaceFile(HostPath(c.path), c.text, c.mode);
     if (engine == Engine::Ifupdown) {
-        Run({"/sbin/ifup", change.iface}, what, left());
+        Run({"/sbin/ifup", change.iface}, what, budget.Left());
         ReleasePorts(portsBefore, BridgePorts(InterfacesFiles(), change.iface), what);
     } else {
-        Run({"/sbin/ifreload", "-a"}, what, left());
+        Run({"/sbin/ifreload", "-a"}, what, budget.Left());
     }
     if (engine == Engine::Ifupdown2 && change.ip && change.ip->GetUseIpv6RouterAdvertised())
         EnableRouterAdvertisements(change.iface);
 
-    WaitFor(change, dhcp ? start : Clock::now(), dhcp ? DHCP_MS : STATIC_MS, what);
+    WaitFor(change, dhcp ? budget : Budget(STATIC_MS), what);
     Syslog(LOG_INFO, "Applied the network configuration of %s", change.iface.c_str());
 }
 
@@ -413,24 +426,20 @@ void ApplyFactoryLayout(const std::string& oldIface, const std::string& bridge, 
     if (files.Files().empty()) throw HostCtlException("/etc/network/interfaces: the file cannot be read");
     KeepFiles(files);
     const std::string what = "restoring the network";
-    const auto start = Clock::now();
-    const auto left = [&] {
-        return DHCP_MS -
-               int(std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start).count());
-    };
+    const Budget budget(DHCP_MS);
     if (engine == Engine::Ifupdown && !oldIface.empty())
-        Run({"/sbin/ifdown", "--no-scripts", "--force", oldIface}, what, left());
+        Run({"/sbin/ifdown", "--no-scripts", "--force", oldIface}, what, budget.Left());
     const auto& main = files.Files().front();
     ReplaceFile(HostPath(main.path), FactoryLayout(bridge, uplink, nics, engine), main.mode);
     if (engine == Engine::Ifupdown)
-        Run({"/sbin/ifup", bridge}, what, left());
+        Run({"/sbin/ifup", bridge}, what, budget.Left());
     else
-        Run({"/sbin/ifreload", "-a"}, what, left());
+        Run({"/sbin/ifreload", "-a"}, what, budget.Left());
     PendingChange lease;
     lease.iface = bridge;
     lease.ip.emplace();
     lease.ip->SetUseDhcp(true);
-    WaitFor(lease, start, DHCP_MS, what);
+    WaitFor(lease, budget, what);
     Syslog(LOG_INFO, "Restored the network: %s on %s with DHCP", bridge.c_str(), uplink.c_str());
 }
 
@@ -511,12 +520,7 @@ void PutBackFiles(const std::string& saved, const std::string& iface,
     const Engine engine = DetectEngine();
     const std::string what = "putting back the network configuration of " + iface;
     const PendingChange expected = SavedChange(files, iface);
-    const bool dhcp = expected.ip->GetUseDhcp();
-    const auto start = Clock::now();
-    const auto left = [&] {
-        const auto spent = std::chrono::duration_cast<std::chrono::milliseconds>(Clock::now() - start);
-        return dhcp ? DHCP_MS - int(spent.count()) : ENGINE_MS;
-    };
+    const Budget budget(PUT_BACK_MS);
     // A write that fails must not leave the interface down: the engine runs
     // anyway, and the failure is told afterwards.
     std::exception_ptr failed;
@@ -539,10 +543,10 @@ void PutBackFiles(const std::string& saved, const std::string& iface,
         // Down with the files in force (they know what is up), without the
         // hook scripts: the bridge and its VM ports stay.
         const std::vector<std::string> portsBefore = BridgePorts(InterfacesFiles(), iface);
-        Run({"/sbin/ifdown", "--no-scripts", "--force", iface}, what, left());
+        Run({"/sbin/ifdown", "--no-scripts", "--force", iface}, what, budget.Left());
         write(false);
         besides();
-        Run({"/sbin/ifup", iface}, what, left());
+        Run({"/sbin/ifup", iface}, what, budget.Left());
         ReleasePorts(portsBefore, BridgePorts(InterfacesFiles(), iface), what);
     } else {
         // ifreload takes VM ports off a bridge its file does not condone
@@ -550,11 +554,11 @@ void PutBackFiles(const std::string& saved, const std::string& iface,
         // files then go back byte for byte.
         write(true);
         besides();
-        Run({"/sbin/ifreload", "-a"}, what, left());
+        Run({"/sbin/ifreload", "-a"}, what, budget.Left());
         write(false);
     }
     if (failed) std::rethrow_exception(failed);
-    WaitFor(expected, dhcp ? start : Clock::now(), dhcp ? DHCP_MS : STATIC_MS, what);
+    WaitFor(expected, budget, what);
     Syslog(LOG_INFO, "Put back the saved network configuration of %s", iface.c_str());
 }
 
