@@ -124,7 +124,7 @@ int main(int argc, char** argv) {
     // the change was on trial) is put back before anyone sees the network.
     try {
         Velk::WelcomeWindow::SetNotice(Velk::NetworkTrial::RecoverAtStart());
-    } catch (const HostCtl::Lib::HostCtlException& e) {
+    } catch (const std::exception& e) {
         Syslog(LOG_ERR, "Putting back an unfinished network change failed: %s", e.what());
     }
     Velk::WelcomeWindow* welcome = new Velk::WelcomeWindow();

@@ -168,20 +168,20 @@ int Boot(const std::vector<std::string>& args) {
     return 0;
 }
 
-// Whether `name` ('OPERATION [WORD]') names a host control operation; the
-// problem goes to standard error when it names neither one nor a host tool.
-bool IsOperationName(const std::string& name, bool& known) {
+// What `name` ('OPERATION [WORD]') names: a host control operation or a
+// host tool; the problem goes to standard error when it names neither.
+enum class Target { Operation, Tool, Unknown };
+
+Target TargetOf(const std::string& name) {
     const std::vector<std::string>& operations = HostCtl::Lib::SimulatedOperations();
     const std::string named = name.substr(0, name.find(' '));
-    known = true;
-    if (std::find(operations.begin(), operations.end(), named) != operations.end()) return true;
-    if (VelkTools::IsToolFaultName(name)) return false;
+    if (std::find(operations.begin(), operations.end(), named) != operations.end()) return Target::Operation;
+    if (VelkTools::IsToolFaultName(name)) return Target::Tool;
     std::string list, tools;
     for (const std::string& operation : operations) list += (list.empty() ? "" : " ") + operation;
     for (const std::string& tool : VelkTools::ToolNames()) tools += (tools.empty() ? "" : " ") + tool;
     Error("unknown operation \"" + name + "\"; the operations are: " + list + "; the tools are: " + tools);
-    known = false;
-    return false;
+    return Target::Unknown;
 }
 
 // Sets or clears a fault: the named host control operation, or the calls of
@@ -189,9 +189,9 @@ bool IsOperationName(const std::string& name, bool& known) {
 int Fail(const std::vector<std::string>& args) {
     if (args.size() < 2 || args.size() > 3) return Usage("fail takes ROOT OPERATION [MESSAGE | --clear]");
     const std::string& operation = args[1];
-    bool known = false;
-    const bool tool = !IsOperationName(operation, known);
-    if (!known) return 1;
+    const Target target = TargetOf(operation);
+    if (target == Target::Unknown) return 1;
+    const bool tool = target == Target::Tool;
     const bool clear = args.size() == 3 && args[2] == "--clear";
     const std::string message = args.size() == 3 ? args[2] : "simulated failure of " + operation;
     if (!clear && message.empty()) return Usage("the message of a fault may not be empty");
@@ -212,9 +212,9 @@ int Fail(const std::vector<std::string>& args) {
 int Slow(const std::vector<std::string>& args) {
     if (args.size() != 3) return Usage("slow takes ROOT 'OPERATION [WORD]' SECONDS");
     const std::string& name = args[1];
-    bool known = false;
-    const bool tool = !IsOperationName(name, known);
-    if (!known) return 1;
+    const Target target = TargetOf(name);
+    if (target == Target::Unknown) return 1;
+    const bool tool = target == Target::Tool;
     double seconds = -1;
     try {
         size_t used = 0;

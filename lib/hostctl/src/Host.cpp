@@ -19,6 +19,7 @@
 #include <string>
 #include <system_error>
 
+#include "UniqueFd.hpp"
 #include "hostctl/Backend.hpp"
 #include "hostctl/SimState.hpp"
 #include "linux/LinuxBackend.hpp"
@@ -252,21 +253,11 @@ void WithFolderLock(const std::string& folder, const std::function<void(int fold
     std::error_code ec;
     std::filesystem::create_directories(folder, ec);
     if (ec) throw HostCtlException(folder + ": cannot create: " + ec.message());
-    const int fd = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-    if (fd < 0) throw HostCtlException(folder + ": cannot open: " + std::strerror(errno));
-    while (flock(fd, LOCK_EX) < 0) {
-        if (errno == EINTR) continue;
-        const int err = errno;
-        close(fd);
-        throw HostCtlException(folder + ": cannot lock: " + std::strerror(err));
-    }
-    try {
-        body(fd);
-    } catch (...) {
-        close(fd);  // releases the lock
-        throw;
-    }
-    close(fd);
+    const UniqueFd fd(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));  // closing unlocks
+    if (fd.Get() < 0) throw HostCtlException(folder + ": cannot open: " + std::strerror(errno));
+    while (flock(fd.Get(), LOCK_EX) < 0)
+        if (errno != EINTR) throw HostCtlException(folder + ": cannot lock: " + std::strerror(errno));
+    body(fd.Get());
 }
 
 void ReplaceFile(const std::string& path, const std::string& text, mode_t mode) {

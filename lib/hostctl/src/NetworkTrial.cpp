@@ -12,7 +12,6 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
-#include <filesystem>
 #include <functional>
 #include <nlohmann/json.hpp>
 #include <optional>
@@ -134,9 +133,13 @@ std::optional<Saved> Load() {
 
 // The marker read under the lock; a host without one is not locked (nor its
 // folder made) for the question.
-std::optional<Saved> ReadSaved() {
+bool NoMarker() {
     struct stat st;
-    if (stat(MarkerPath().c_str(), &st) < 0 && errno == ENOENT) return std::nullopt;
+    return stat(MarkerPath().c_str(), &st) < 0 && errno == ENOENT;
+}
+
+std::optional<Saved> ReadSaved() {
+    if (NoMarker()) return std::nullopt;
     std::optional<Saved> saved;
     Locked([&](int) { saved = Load(); });
     return saved;
@@ -215,7 +218,7 @@ PendingChange NetworkTrialImpl::Save(const std::string& user) {
 
 std::optional<PendingChange> NetworkTrialImpl::Pending() {
     std::optional<PendingChange> pending;
-    if (!std::filesystem::exists(MarkerPath())) return pending;
+    if (NoMarker()) return pending;
     Locked([&](int) {
         if (const std::optional<Saved> saved = Load())
             pending = PendingChange{saved->user, saved->description, HeldElsewhere()};
