@@ -131,13 +131,14 @@ std::optional<Saved> Load() {
     return std::nullopt;
 }
 
-// The marker read under the lock; a host without one is not locked (nor its
+// Whether the host has no marker: then nothing is locked (nor the marker's
 // folder made) for the question.
 bool NoMarker() {
     struct stat st;
     return stat(MarkerPath().c_str(), &st) < 0 && errno == ENOENT;
 }
 
+// The marker read under the lock.
 std::optional<Saved> ReadSaved() {
     if (NoMarker()) return std::nullopt;
     std::optional<Saved> saved;
